@@ -1,0 +1,28 @@
+# Options every target of this project builds with, carried by one interface
+# target that each target links privately (nothing is set globally).
+add_library(ulo_db_build_options INTERFACE)
+target_compile_features(ulo_db_build_options INTERFACE cxx_std_17)
+target_compile_options(ulo_db_build_options INTERFACE -Wall -Wextra -Werror=format)
+
+if(ULO_DB_SANITIZER STREQUAL "address")
+    set(_ulo_sanitize -fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer)
+elseif(ULO_DB_SANITIZER STREQUAL "thread")
+    set(_ulo_sanitize -fsanitize=thread -fno-omit-frame-pointer)
+elseif(NOT ULO_DB_SANITIZER STREQUAL "")
+    message(FATAL_ERROR "ULO_DB_SANITIZER must be '', 'address' or 'thread', not '${ULO_DB_SANITIZER}'")
+endif()
+if(_ulo_sanitize)
+    target_compile_options(ulo_db_build_options INTERFACE ${_ulo_sanitize})
+    target_link_options(ulo_db_build_options INTERFACE ${_ulo_sanitize})
+endif()
+
+# Writes a pkg-config file NAME.pc for an installed library.
+function(ulo_db_install_pkgconfig name description requires cflags libs)
+    set(PC_NAME "${name}")
+    set(PC_DESCRIPTION "${description}")
+    set(PC_REQUIRES "${requires}")
+    set(PC_CFLAGS "${cflags}")
+    set(PC_LIBS "${libs}")
+    configure_file("${PROJECT_SOURCE_DIR}/cmake/pkgconfig.pc.in" "${PROJECT_BINARY_DIR}/pkgconfig/${name}.pc" @ONLY)
+    install(FILES "${PROJECT_BINARY_DIR}/pkgconfig/${name}.pc" DESTINATION "${CMAKE_INSTALL_LIBDIR}/pkgconfig")
+endfunction()
