@@ -38,7 +38,6 @@ private:
 // The pair rule of the requests' two-part getters: when both first and
 // second hold a text, assigns them to outFirst and outSecond and returns
 // true; otherwise touches neither output and returns false.
-bool DACopyPair(const DAOwnedString& first, const DAOwnedString& second, std::string& outFirst,
-                std::string& outSecond);
+bool DACopyPair(const DAOwnedString& first, const DAOwnedString& second, std::string& outFirst, std::string& outSecond);
 
 #endif  // DAOWNEDSTRING_H

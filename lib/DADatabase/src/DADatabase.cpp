@@ -50,8 +50,7 @@ int Execute(DADatabase& database, Request& request, void (DASqlGenerator::*gener
         DA_LOG_AT(DLOG_INFO, func, "%s SUCCESS[%d]", word, rc);
     } else {
         // sqlite3_exec gives no text when it runs out of memory.
-        DA_LOG_AT(DLOG_ERROR, func, "%s FAILED[%d]: %s", word, rc,
-                  error != nullptr ? error.get() : sqlite3_errstr(rc));
+        DA_LOG_AT(DLOG_ERROR, func, "%s FAILED[%d]: %s", word, rc, error != nullptr ? error.get() : sqlite3_errstr(rc));
     }
     return rc;
 }

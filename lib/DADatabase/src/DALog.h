@@ -26,9 +26,9 @@ inline const char* DASourceFileName(const char* path)
 
 // The line with every field given: for helpers that log on behalf of an
 // operation in another source file.
-#define DA_LOG_WHERE(prio, file, func, line, fmt, ...)                                                \
-    __dlog_print(LOG_ID_MAIN, (prio), DALogger::GetInstance()->GetLogTag(), "%s: %s(%d) > " fmt, (file), \
-                 (func), (line), ##__VA_ARGS__)
+#define DA_LOG_WHERE(prio, file, func, line, fmt, ...)                                                                 \
+    __dlog_print(LOG_ID_MAIN, (prio), DALogger::GetInstance()->GetLogTag(), "%s: %s(%d) > " fmt, (file), (func),       \
+                 (line), ##__VA_ARGS__)
 
 // For helpers that log on behalf of another function of the same file.
 #define DA_LOG_AT(prio, func, fmt, ...) DA_LOG_WHERE(prio, DA_FILE_NAME, func, __LINE__, fmt, ##__VA_ARGS__)

@@ -133,7 +133,7 @@ void DASqlGenerator::GetJoinSql(DAJoinRequest& request, std::string& sql)
     request.GetWhereMap(conditions);
 
     std::string text = "SELECT  * FROM " + leftTable + " INNER JOIN " + rightTable + " ON " + leftTable + "." +
-                       leftColumn + " = " + rightTable + "." + rightColumn;
+        leftColumn + " = " + rightTable + "." + rightColumn;
     if (!conditions.empty()) {
         AppendWhere(text, conditions);
     }

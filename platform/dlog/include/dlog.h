@@ -20,13 +20,7 @@ extern "C" {
 #endif
 
 /* Log buffers. The library writes to the main buffer only. */
-typedef enum {
-    LOG_ID_MAIN = 0,
-    LOG_ID_RADIO,
-    LOG_ID_SYSTEM,
-    LOG_ID_APPS,
-    LOG_ID_MAX
-} log_id_t;
+typedef enum { LOG_ID_MAIN = 0, LOG_ID_RADIO, LOG_ID_SYSTEM, LOG_ID_APPS, LOG_ID_MAX } log_id_t;
 
 /* Priorities. The library uses DLOG_INFO (4), DLOG_WARN (5), DLOG_ERROR (6). */
 typedef enum {

@@ -34,8 +34,7 @@ bool DAOwnedString::CopyTo(std::string& out) const
     return true;
 }
 
-bool DACopyPair(const DAOwnedString& first, const DAOwnedString& second, std::string& outFirst,
-                std::string& outSecond)
+bool DACopyPair(const DAOwnedString& first, const DAOwnedString& second, std::string& outFirst, std::string& outSecond)
 {
     if (!first.IsSet() || !second.IsSet()) {
         return false;
