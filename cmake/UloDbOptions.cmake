@@ -16,8 +16,11 @@ if(_ulo_sanitize)
     target_link_options(ulo_db_build_options INTERFACE ${_ulo_sanitize})
 endif()
 
-# Writes a pkg-config file NAME.pc for an installed library.
+# Writes a pkg-config file NAME.pc for an installed library. The prefix is
+# found relative to the .pc file, so the package works wherever
+# `cmake --install --prefix` puts it.
 function(ulo_db_install_pkgconfig name description requires cflags libs)
+    file(RELATIVE_PATH PC_RELATIVE_PREFIX "/root/${CMAKE_INSTALL_LIBDIR}/pkgconfig" "/root")
     set(PC_NAME "${name}")
     set(PC_DESCRIPTION "${description}")
     set(PC_REQUIRES "${requires}")

@@ -1,0 +1,276 @@
+// A tour of libulo_db on a real database file: create two related tables,
+// write, query, join, check and drop, printing each step's result code, the
+// statement the library generated, every result as a table, and the
+// library's own log lines as they are written.
+//
+//   ulo_db_demo [directory]     (default: /tmp/ulo_db_demo, created if missing)
+//
+// Running it again on the same folder gives the same output: every write is
+// an insert-or-replace on a keyed table, and the scratch table is dropped.
+
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "DADatabase.h"
+#include "DASqlGenerator.h"
+#include "dlog.h"
+
+namespace {
+
+const char* const kDefaultDir = "/tmp/ulo_db_demo";
+const char* const kFile = "demo.db";
+
+// Column names are kept by pointer in the requests: named constants make
+// that explicit (string literals would do as well).
+const char* const kId = "id";
+const char* const kTitle = "title";
+const char* const kPhone = "phone";
+const char* const kName = "name";
+const char* const kGroupId = "group_id";
+const char* const kGroupTitle = "groups.title";
+
+int g_unexpected = 0;
+
+// Shows the library's log lines inline with the demo's output.
+void PrintLogLine(int /*logId*/, int prio, const char* tag, const char* text, void* /*user*/)
+{
+    static const char letters[] = "??VDIWEFS";
+    const char letter = (prio >= 0 && prio < 9) ? letters[prio] : '?';
+    std::printf("    log %c/%s: %s\n", letter, tag, text);
+}
+
+void Step(const char* title, const std::string& sql)
+{
+    std::printf("\n== %s\n   SQL: %s\n", title, sql.c_str());
+}
+
+void Result(int rc, int expected)
+{
+    std::printf("   result: %d%s\n", rc, rc == expected ? "" : "  <-- unexpected");
+    if (rc != expected) {
+        ++g_unexpected;
+    }
+}
+
+// Prints the cursor as an aligned table, walking it as an application would.
+void PrintCursor(DACursor& cursor)
+{
+    std::vector<std::string> columns;
+    if (cursor.GetColumn(columns) != 0) {
+        std::printf("   (no rows)\n");
+        return;
+    }
+    std::vector<std::vector<std::string>> rows;
+    cursor.MoveToFirst();
+    while (cursor.MoveToNext() == 0) {
+        std::vector<std::string> row;
+        for (const std::string& column : columns) {
+            std::string value;
+            cursor.GetString(column.c_str(), value);
+            row.push_back(value);
+        }
+        rows.push_back(row);
+    }
+    std::vector<size_t> widths;
+    for (size_t i = 0; i < columns.size(); ++i) {
+        size_t width = columns[i].size();
+        for (const auto& row : rows) {
+            width = std::max(width, row[i].size());
+        }
+        widths.push_back(width);
+    }
+    auto printRow = [&](const std::vector<std::string>& cells) {
+        std::printf("   |");
+        for (size_t i = 0; i < cells.size(); ++i) {
+            std::printf(" %-*s |", static_cast<int>(widths[i]), cells[i].c_str());
+        }
+        std::printf("\n");
+    };
+    printRow(columns);
+    std::printf("   |");
+    for (size_t width : widths) {
+        std::printf("%s|", std::string(width + 2, '-').c_str());
+    }
+    std::printf("\n");
+    for (const auto& row : rows) {
+        printRow(row);
+    }
+    std::printf("   %d row(s)\n", cursor.GetCount() < 0 ? 0 : cursor.GetCount());
+}
+
+template <typename Request>
+void SetLocation(Request& request, const char* dir, const char* table)
+{
+    request.SetPath(dir, kFile);
+    request.SetTable(table);
+}
+
+void CreateTables(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    std::string sql;
+    DACreateRequest groups;
+    SetLocation(groups, dir, "groups");
+    groups.SetPrimaryKey(kId, "INTEGER");
+    groups.SetColumnKey(kTitle, "TEXT");
+    generator.GetCreateTableSql(groups, sql);
+    Step("Create the table groups (keyed by id)", sql);
+    Result(db.CreateTable(groups), SQLITE_OK);
+
+    DACreateRequest contacts;
+    SetLocation(contacts, dir, "contacts");
+    contacts.SetPrimaryKey(kPhone, "TEXT");
+    contacts.SetColumnKey(kName, "TEXT");
+    contacts.SetColumnKey(kGroupId, "INTEGER");
+    generator.GetCreateTableSql(contacts, sql);
+    Step("Create the table contacts (keyed by phone, group_id refers to groups)", sql);
+    Result(db.CreateTable(contacts), SQLITE_OK);
+}
+
+void WriteRows(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    std::string sql;
+    const struct {
+        int id;
+        const char* title;
+    } groups[] = {{1, "Family"}, {2, "Work"}};
+    for (const auto& group : groups) {
+        DAUpsertRequest upsert;
+        SetLocation(upsert, dir, "groups");
+        upsert.SetData(kId, group.id);
+        upsert.SetData(kTitle, group.title);
+        generator.GetUpsertSql(upsert, sql);
+        Step("Upsert a group", sql);
+        Result(db.Upsert(upsert), SQLITE_OK);
+    }
+
+    const struct {
+        const char* phone;
+        const char* name;
+        int group;
+    } contacts[] = {{"010-1111", "Kim", 1}, {"010-2222", "Lee", 2}, {"010-3333", "Park", 1}, {"010-4444", "Choi", 1}};
+    for (const auto& contact : contacts) {
+        DAUpsertRequest upsert;
+        SetLocation(upsert, dir, "contacts");
+        upsert.SetData(kPhone, contact.phone);
+        upsert.SetData(kName, contact.name);
+        upsert.SetData(kGroupId, contact.group);
+        generator.GetUpsertSql(upsert, sql);
+        Step("Upsert a contact", sql);
+        Result(db.Upsert(upsert), SQLITE_OK);
+    }
+
+    DAUpdateRequest update;
+    SetLocation(update, dir, "contacts");
+    update.SetData(kName, "Kim Min-ji");
+    update.SetWhere(kPhone, "010-1111");
+    generator.GetUpdateSql(update, sql);
+    Step("Update Kim's name", sql);
+    Result(db.Update(update), SQLITE_OK);
+
+    DADeleteRequest remove;
+    SetLocation(remove, dir, "contacts");
+    remove.SetWhere(kPhone, "010-3333");
+    generator.GetDeleteSql(remove, sql);
+    Step("Delete Park", sql);
+    Result(db.Delete(remove), SQLITE_OK);
+}
+
+void Query(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    std::string sql;
+    DACursor cursor;
+
+    DASelectRequest all;
+    SetLocation(all, dir, "contacts");
+    generator.GetSelectSql(all, sql);
+    Step("Select every contact", sql);
+    Result(db.Select(all, cursor), SQLITE_OK);
+    PrintCursor(cursor);
+
+    DASelectRequest family;
+    SetLocation(family, dir, "contacts");
+    family.SetWhere(kGroupId, 1);
+    generator.GetSelectSql(family, sql);
+    Step("Select the contacts of group 1, reading typed values", sql);
+    Result(db.Select(family, cursor), SQLITE_OK);
+    while (cursor.MoveToNext() == 0) {
+        std::string name;
+        int group = 0;
+        cursor.GetString(kName, name);
+        cursor.GetInt(kGroupId, group);
+        std::printf("   %s is in group %d\n", name.c_str(), group);
+    }
+
+    DAJoinRequest join;
+    join.SetPath(dir, kFile);
+    join.SetLeftJoin("contacts", kGroupId);
+    join.SetRightJoin("groups", kId);
+    join.SetWhere(kGroupTitle, "Family");
+    generator.GetJoinSql(join, sql);
+    Step("Inner join contacts with groups, Family only", sql);
+    Result(db.JoinSelect(join, cursor), SQLITE_OK);
+    PrintCursor(cursor);
+
+    DASelectRequest missing;
+    SetLocation(missing, dir, "no_such_table");
+    generator.GetSelectSql(missing, sql);
+    Step("Select from a table that does not exist (fails on purpose)", sql);
+    Result(db.Select(missing, cursor), SQLITE_ERROR);
+}
+
+void CheckAndDrop(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    std::string sql;
+    DABasePath location;
+    location.SetPath(dir, kFile);
+    for (const char* table : {"contacts", "notes"}) {
+        bool exists = false;
+        generator.GetCheckTableSql(table, sql);
+        Step("Check whether a table exists", sql);
+        Result(db.CheckExistTable(location, table, exists), SQLITE_OK);
+        std::printf("   %s exists: %s\n", table, exists ? "yes" : "no");
+    }
+
+    DACreateRequest notes;
+    SetLocation(notes, dir, "notes");
+    notes.SetColumnKey("body", "TEXT");
+    generator.GetCreateTableSql(notes, sql);
+    Step("Create a scratch table", sql);
+    Result(db.CreateTable(notes), SQLITE_OK);
+
+    DADropRequest drop;
+    SetLocation(drop, dir, "notes");
+    generator.GetDropTableSql(drop, sql);
+    Step("Drop the scratch table", sql);
+    Result(db.DropTable(drop), SQLITE_OK);
+}
+
+}  // namespace
+
+int main(int argc, char** argv)
+{
+    const char* dir = argc > 1 ? argv[1] : kDefaultDir;
+    if (mkdir(dir, 0755) != 0 && errno != EEXIST) {
+        std::fprintf(stderr, "cannot create %s: %s\n", dir, std::strerror(errno));
+        return 2;
+    }
+    std::setvbuf(stdout, nullptr, _IOLBF, 0);
+    dlog_set_sink(PrintLogLine, nullptr);
+
+    std::printf("libulo_db demo on %s/%s\n", dir, kFile);
+    DADatabase db;
+    DASqlGenerator generator;
+    CreateTables(db, generator, dir);
+    WriteRows(db, generator, dir);
+    Query(db, generator, dir);
+    CheckAndDrop(db, generator, dir);
+
+    std::printf("\n%s\n", g_unexpected == 0 ? "Every step gave the expected result." : "Some steps failed.");
+    return g_unexpected == 0 ? 0 : 1;
+}

@@ -1,0 +1,59 @@
+// A program outside the build tree, built only against the installed
+// package: it includes every public header and calls into all three
+// libraries, then checks one round trip through a real database file.
+#include <cstdio>
+#include <cstdlib>
+#include <string>
+
+#include <DABasePath.h>
+#include <DABaseSet.h>
+#include <DACreateRequest.h>
+#include <DACursor.h>
+#include <DADatabase.h>
+#include <DADatabaseParser.h>
+#include <DADeleteRequest.h>
+#include <DADropRequest.h>
+#include <DAJoinRequest.h>
+#include <DALogger.h>
+#include <DAMutex.h>
+#include <DASelectRequest.h>
+#include <DASqlGenerator.h>
+#include <DAUpdateRequest.h>
+#include <DAUpsertRequest.h>
+#include <dlog.h>
+
+int main(int argc, char** argv)
+{
+    if (argc != 2) {
+        std::fprintf(stderr, "usage: consumer DIRECTORY\n");
+        return 2;
+    }
+    const char* dir = argv[1];
+    __dlog_print(LOG_ID_MAIN, DLOG_INFO, DALogger::GetInstance()->GetLogTag(), "consumer %s", "started");
+    DAMutex mutex("consumer");
+    mutex.Lock();
+    mutex.Unlock();
+
+    DACreateRequest create;
+    create.SetPath(dir, "consumer.db");
+    create.SetTable("items");
+    create.SetColumnKey("label", "TEXT");
+    DAUpsertRequest upsert;
+    upsert.SetPath(dir, "consumer.db");
+    upsert.SetTable("items");
+    upsert.SetData("label", "installed");
+    DASelectRequest select;
+    select.SetPath(dir, "consumer.db");
+    select.SetTable("items");
+
+    DADatabase db;
+    DACursor cursor;
+    std::string label;
+    if (db.CreateTable(create) != 0 || db.Upsert(upsert) != 0 || db.Select(select, cursor) != 0
+        || cursor.MoveToNext() != 0 || cursor.GetString("label", label) != 0 || label != "installed") {
+        std::fprintf(stderr, "consumer: round trip failed\n");
+        return 1;
+    }
+    std::printf("consumer: ok\n");
+    return 0;
+}
