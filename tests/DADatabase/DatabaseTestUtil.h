@@ -1,0 +1,97 @@
+#ifndef ULO_TESTS_DATABASETESTUTIL_H
+#define ULO_TESTS_DATABASETESTUTIL_H
+
+// Helpers shared by the tests that run on real database files: a raw
+// SQLite connection for seeding and checking files, a compact view of the
+// captured log lines, and the open-descriptor count of the process.
+
+#include <dirent.h>
+
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+
+#include "LogCapture.h"
+
+// Every captured line as "priority file:function > message", so a whole log
+// can be compared at once with a readable difference.
+inline std::vector<std::string> Described(const LogCapture& log)
+{
+    std::vector<std::string> out;
+    for (const LogLine& line : log.Lines()) {
+        out.push_back(std::to_string(line.priority) + " " + line.file + ":" + line.function + " > " + line.message);
+    }
+    return out;
+}
+
+// The busy warnings "SQLITE BUSY[1]".."SQLITE BUSY[n]" written from file.
+inline std::vector<std::string> BusyWarnings(const std::string& file, int n)
+{
+    std::vector<std::string> out;
+    for (int i = 1; i <= n; ++i) {
+        out.push_back("5 " + file + ":IsRetryLimit > SQLITE BUSY[" + std::to_string(i) + "]");
+    }
+    return out;
+}
+
+inline int OpenDescriptorCount()
+{
+    int count = 0;
+    if (DIR* dir = opendir("/proc/self/fd")) {
+        while (readdir(dir) != nullptr) {
+            ++count;
+        }
+        closedir(dir);
+    }
+    return count;
+}
+
+// A plain connection to a database file, independent of the library.
+class RawDb {
+public:
+    explicit RawDb(const std::string& path) { EXPECT_EQ(SQLITE_OK, sqlite3_open(path.c_str(), &m_db)) << path; }
+    ~RawDb() { sqlite3_close(m_db); }
+    RawDb(const RawDb&) = delete;
+    RawDb& operator=(const RawDb&) = delete;
+
+    sqlite3* Handle() const { return m_db; }
+
+    // Runs sql and expects it to succeed.
+    void Run(const std::string& sql)
+    {
+        char* error = nullptr;
+        const int rc = sqlite3_exec(m_db, sql.c_str(), nullptr, nullptr, &error);
+        EXPECT_EQ(SQLITE_OK, rc) << sql << ": " << (error != nullptr ? error : "");
+        sqlite3_free(error);
+    }
+
+    // The rows of sql, columns joined by "|" and rows by ";", NULL as "NULL".
+    std::string Query(const std::string& sql)
+    {
+        std::string out;
+        char* error = nullptr;
+        const int rc = sqlite3_exec(
+            m_db, sql.c_str(),
+            [](void* user, int count, char** values, char**) {
+                auto* text = static_cast<std::string*>(user);
+                if (!text->empty()) {
+                    *text += ";";
+                }
+                for (int i = 0; i < count; ++i) {
+                    *text += (i > 0 ? "|" : "") + std::string(values[i] != nullptr ? values[i] : "NULL");
+                }
+                return 0;
+            },
+            &out, &error);
+        EXPECT_EQ(SQLITE_OK, rc) << sql << ": " << (error != nullptr ? error : "");
+        sqlite3_free(error);
+        return out;
+    }
+
+private:
+    sqlite3* m_db = nullptr;
+};
+
+#endif  // ULO_TESTS_DATABASETESTUTIL_H
