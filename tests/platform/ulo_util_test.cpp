@@ -1,0 +1,83 @@
+#include <atomic>
+#include <chrono>
+#include <cstring>
+#include <future>
+#include <memory>
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include "DALogger.h"
+#include "DAMutex.h"
+
+namespace {
+
+// Another thread locks its own DAMutex made from name: it must stay blocked
+// while the lock is held, and get through once unlock() has run.
+template <typename Unlock>
+void ExpectBlockedUntil(const std::string& name, Unlock unlock)
+{
+    std::atomic<bool> acquired{false};
+    std::future<void> other = std::async(std::launch::async, [name, &acquired] {
+        DAMutex mutex(name.c_str());
+        mutex.Lock();
+        acquired = true;
+        mutex.Unlock();
+    });
+    EXPECT_EQ(other.wait_for(std::chrono::milliseconds(200)), std::future_status::timeout);
+    EXPECT_FALSE(acquired);
+    unlock();
+    EXPECT_EQ(other.wait_for(std::chrono::seconds(5)), std::future_status::ready);
+    EXPECT_TRUE(acquired);
+}
+
+TEST(DAMutex, EqualNamesShareOneLock)
+{
+    char name[] = "7ffd1234abc0";
+    DAMutex holder(name);
+    holder.Lock();
+    std::strcpy(name, "000000000000");  // the text counts, not the buffer
+    ExpectBlockedUntil("7ffd1234abc0", [&holder] { holder.Unlock(); });
+    holder.Lock();  // and it can be taken again
+    ExpectBlockedUntil("7ffd1234abc0", [&holder] { holder.Unlock(); });
+}
+
+TEST(DAMutex, DestroyingAHolderReleasesTheLock)
+{
+    auto holder = std::make_unique<DAMutex>("dead1");
+    holder->Lock();
+    ExpectBlockedUntil("dead1", [&holder] { holder.reset(); });
+}
+
+TEST(DAMutex, UnlockWithoutLockIsHarmless)
+{
+    DAMutex idle("beef2");
+    idle.Unlock();
+    DAMutex holder("beef2");
+    holder.Lock();
+    idle.Unlock();  // must not release the lock that holder took
+    ExpectBlockedUntil("beef2", [&holder] { holder.Unlock(); });
+    holder.Unlock();
+}
+
+TEST(DAMutex, ObjectsWithNewNamesComeAndGo)
+{
+    for (int i = 0; i < 100000; ++i) {
+        DAMutex mutex(std::to_string(i).c_str());
+        mutex.Lock();
+        mutex.Unlock();
+    }
+    DAMutex holder("0");  // an old name still names a working lock
+    holder.Lock();
+    ExpectBlockedUntil("0", [&holder] { holder.Unlock(); });
+}
+
+TEST(DALogger, OneInstanceWithTheLibraryTag)
+{
+    DALogger* const logger = DALogger::GetInstance();
+    ASSERT_NE(logger, nullptr);
+    EXPECT_STREQ(logger->GetLogTag(), "ULO_DB");
+    EXPECT_EQ(std::async(std::launch::async, [] { return DALogger::GetInstance(); }).get(), logger);
+}
+
+}  // namespace
