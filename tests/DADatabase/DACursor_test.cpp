@@ -48,7 +48,7 @@ std::vector<std::string> Names(DACursor& cursor)
 
 }  // namespace
 
-TEST(DACursorStorage, NewCursorIsEmpty)
+TEST(DACursorStorage, EmptyCursor)
 {
     LogCapture log;
     DACursor cursor;
@@ -58,15 +58,31 @@ TEST(DACursorStorage, NewCursorIsEmpty)
     EXPECT_EQ(std::vector<std::string>{"kept"}, names);
     EXPECT_EQ(-1, cursor.GetPosition());
     EXPECT_FALSE(cursor.IsValidPosition(0));
-    EXPECT_TRUE(log.Lines().empty());
+    EXPECT_EQ(1, cursor.MoveToPosition(0));
+    EXPECT_EQ(3, cursor.MoveToNext());
+    EXPECT_EQ(-2, cursor.GetPosition());
+    cursor.MoveToFirst();
+    EXPECT_EQ(2, cursor.MoveToPrev());
+    EXPECT_EQ(0, cursor.GetPosition());
+    cursor.MoveToLast();
+    EXPECT_EQ(-1, cursor.GetPosition());
+    EXPECT_EQ((std::vector<std::string>{Line(6, "MoveToPosition", "Invalid Position"),
+                                        Line(4, "MoveToNext", "Last Row"), Line(4, "MoveToPrev", "First Row")}),
+              Described(log));
 }
 
-TEST(DACursorStorage, ColumnsListedInRegistrationOrderAndCountedByRows)
+TEST(DACursorStorage, ColumnsInRegistrationOrderUntilInitialize)
 {
     DACursor cursor;
     LoadThreeRows(cursor);
     EXPECT_EQ(3, cursor.GetCount());
     EXPECT_EQ((std::vector<std::string>{"b", "a"}), Names(cursor));
+    ASSERT_EQ(0, cursor.MoveToPosition(2));
+    cursor.Initialize();
+    std::vector<std::string> names{"kept"};
+    EXPECT_EQ(-1, cursor.GetCount());
+    EXPECT_EQ(1, cursor.GetColumn(names));
+    EXPECT_EQ(-1, cursor.GetPosition());
 }
 
 // The count is the length of the second column in name order, or of the only
@@ -96,30 +112,6 @@ TEST(DACursorStorage, CountTakesSecondColumnInNameOrder)
         }
         EXPECT_EQ(c.count, cursor.GetCount()) << "first column " << c.columns.front().first;
     }
-}
-
-TEST(DACursorStorage, NameRegisteredTwiceSortingFirstCountsRows)
-{
-    DACursor cursor;
-    Load(cursor, {"_ID", "name", "_ID", "title"},
-         {{"1", "Kim", "7", "Family"}, {"2", "Lee", "8", "Work"}, {"3", "Park", "7", "Family"}});
-    EXPECT_EQ(3, cursor.GetCount());
-    EXPECT_EQ((std::vector<std::string>{"_ID", "name", "_ID", "title"}), Names(cursor));
-
-    // _ID's one list takes both values of every row, in column order, so
-    // reading it by row position walks that list: 1, 7, 2 (of 1, 7, 2, 8, 3, 7).
-    std::vector<std::string> ids;
-    std::vector<std::string> titles;
-    while (cursor.MoveToNext() == 0) {
-        std::string id;
-        std::string title;
-        EXPECT_EQ(0, cursor.GetString("_ID", id));
-        EXPECT_EQ(0, cursor.GetString("title", title));
-        ids.push_back(id);
-        titles.push_back(title);
-    }
-    EXPECT_EQ((std::vector<std::string>{"1", "7", "2"}), ids);
-    EXPECT_EQ((std::vector<std::string>{"Family", "Work", "Family"}), titles);
 }
 
 TEST(DACursorStorage, NameRegisteredTwiceSortingSecondDoublesCount)
@@ -154,18 +146,6 @@ TEST(DACursorStorage, RegisteringAgainKeepsValuesAndUnknownNamesStoreNothing)
     EXPECT_EQ(0, cursor.GetString("b", value));
     EXPECT_EQ("", value);  // an empty value is a value
     EXPECT_TRUE(log.Lines().empty());
-}
-
-TEST(DACursorStorage, InitializeEmptiesALoadedMovedCursor)
-{
-    DACursor cursor;
-    LoadThreeRows(cursor);
-    ASSERT_EQ(0, cursor.MoveToPosition(2));
-    cursor.Initialize();
-    std::vector<std::string> names{"kept"};
-    EXPECT_EQ(-1, cursor.GetCount());
-    EXPECT_EQ(1, cursor.GetColumn(names));
-    EXPECT_EQ(-1, cursor.GetPosition());
 }
 
 TEST(DACursorNavigation, ForwardWalkStopsOnLastRow)
@@ -235,19 +215,6 @@ TEST(DACursorNavigation, MoveToPositionAcceptsOnlyRowsInsideTheCount)
     EXPECT_FALSE(cursor.IsValidPosition(3));
 }
 
-TEST(DACursorNavigation, EmptyCursorPositions)
-{
-    DACursor cursor;
-    EXPECT_EQ(3, cursor.MoveToNext());
-    EXPECT_EQ(-2, cursor.GetPosition());
-    cursor.MoveToFirst();
-    EXPECT_EQ(2, cursor.MoveToPrev());
-    EXPECT_EQ(0, cursor.GetPosition());
-    cursor.MoveToLast();
-    EXPECT_EQ(-1, cursor.GetPosition());
-    EXPECT_EQ(1, cursor.MoveToPosition(0));
-}
-
 TEST(DACursorRead, NameIsCheckedBeforePosition)
 {
     LogCapture log;
@@ -268,24 +235,17 @@ TEST(DACursorRead, NameIsCheckedBeforePosition)
               Described(log));
 }
 
-TEST(DACursorRead, GetStringReadsTheCurrentRow)
-{
-    DACursor cursor;
-    LoadThreeRows(cursor);
-    ASSERT_EQ(0, cursor.MoveToPosition(1));
-    std::string value;
-    EXPECT_EQ(0, cursor.GetString("a", value));
-    EXPECT_EQ("a1", value);
-    EXPECT_EQ(0, cursor.GetString("b", value));
-    EXPECT_EQ("b1", value);
-}
-
 struct ConversionCase {
     const char* text;
     bool doubleOk;
     int asInt;
     double asDouble;
 };
+
+void PrintTo(const ConversionCase& c, std::ostream* os)
+{
+    *os << '"' << c.text << '"';
+}
 
 class DACursorConversion : public ::testing::TestWithParam<ConversionCase> {};
 

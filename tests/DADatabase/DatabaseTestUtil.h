@@ -13,6 +13,7 @@
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 
+#include "DACursor.h"
 #include "LogCapture.h"
 
 // Every captured line as "priority file:function > message", so a whole log
@@ -34,6 +35,19 @@ inline std::vector<std::string> BusyWarnings(const std::string& file, int n)
         out.push_back("5 " + file + ":IsRetryLimit > SQLITE BUSY[" + std::to_string(i) + "]");
     }
     return out;
+}
+
+// The values of column row by row, walking the cursor from its start.
+inline std::vector<std::string> ColumnValues(DACursor& cursor, const char* column)
+{
+    std::vector<std::string> values;
+    cursor.MoveToFirst();
+    while (cursor.MoveToNext() == 0) {
+        std::string value;
+        EXPECT_EQ(0, cursor.GetString(column, value));
+        values.push_back(value);
+    }
+    return values;
 }
 
 inline int OpenDescriptorCount()
