@@ -9,7 +9,7 @@ namespace {
 // Formats the name and returns it; a failed formatting is logged and
 // yields the empty name, which is still a valid lock.
 struct LockName {
-    char text[DAMemberLock::kNameSize];
+    char text[DAMemberLock::kNameSize] = {};
 
     LockName(const void* member, const char* file, const char* func, int line)
     {

@@ -44,6 +44,8 @@ void AppendWhere(std::string& sql, const DAValueMap& conditions)
 
 }  // namespace
 
+// By-value parameter: the signature of the published interface.
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
 void DASqlGenerator::GetDBPath(std::string dir, std::string file, std::string& path)
 {
     // An empty directory makes size() - 1 wrap to npos, the "no slash"
@@ -55,6 +57,8 @@ void DASqlGenerator::GetDBPath(std::string dir, std::string file, std::string& p
     path = std::move(dir);
 }
 
+// By-value parameter: the signature of the published interface.
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
 void DASqlGenerator::GetCheckTableSql(std::string table, std::string& sql)
 {
     std::string text = "SELECT COUNT(*) from sqlite_master WHERE TYPE='table' AND NAME=";
