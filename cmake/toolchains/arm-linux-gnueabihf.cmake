@@ -33,19 +33,20 @@ set(CMAKE_FIND_ROOT_PATH_MODE_PACKAGE ONLY)
 # variable on so they see the same setup.
 list(APPEND CMAKE_TRY_COMPILE_PLATFORM_VARIABLES ULO_DB_ARM_SQLITE_ROOT)
 
-set(_ulo_arm_ld_path "")
+set(_ulo_arm_ld_dirs "")
 if(ULO_DB_ARM_SQLITE_ROOT)
     set(_ulo_sqlite_libdir "${ULO_DB_ARM_SQLITE_ROOT}/usr/lib/${ULO_DB_ARM_TRIPLET}")
     set(SQLite3_INCLUDE_DIR "${ULO_DB_ARM_SQLITE_ROOT}/usr/include" CACHE PATH "armhf sqlite3.h")
     set(SQLite3_LIBRARY "${_ulo_sqlite_libdir}/libsqlite3.so" CACHE FILEPATH "armhf libsqlite3")
-    set(_ulo_arm_ld_path "${_ulo_sqlite_libdir}")
+    list(APPEND _ulo_arm_ld_dirs "${_ulo_sqlite_libdir}")
 endif()
 # The build's own shared libraries are found through the build-tree RPATH;
 # they are also listed here so that a program copied elsewhere in the tree
 # (or built without RPATH) still runs.
 if(CMAKE_BINARY_DIR)
-    string(APPEND _ulo_arm_ld_path ":${CMAKE_BINARY_DIR}/lib/DADatabase:${CMAKE_BINARY_DIR}/platform")
+    list(APPEND _ulo_arm_ld_dirs "${CMAKE_BINARY_DIR}/lib/DADatabase" "${CMAKE_BINARY_DIR}/platform")
 endif()
+list(JOIN _ulo_arm_ld_dirs ":" _ulo_arm_ld_path)
 
 # Every target program (add_test, gtest_discover_tests) runs through qemu,
 # with the ARM dynamic loader and libc from the cross toolchain's folder.
