@@ -49,8 +49,8 @@ int main(int argc, char** argv)
     DADatabase db;
     DACursor cursor;
     std::string label;
-    if (db.CreateTable(create) != 0 || db.Upsert(upsert) != 0 || db.Select(select, cursor) != 0
-        || cursor.MoveToNext() != 0 || cursor.GetString("label", label) != 0 || label != "installed") {
+    if (db.CreateTable(create) != 0 || db.Upsert(upsert) != 0 || db.Select(select, cursor) != 0 ||
+        cursor.MoveToNext() != 0 || cursor.GetString("label", label) != 0 || label != "installed") {
         std::fprintf(stderr, "consumer: round trip failed\n");
         return 1;
     }
