@@ -145,12 +145,18 @@ void Fail(benchmark::State& state, const char* what, int rc)
 
 // Registers one case; every case measures wall-clock time (a commit to disk
 // waits without using the CPU).
-benchmark::internal::Benchmark* Register(const std::string& name, std::function<void(benchmark::State&)> body)
+benchmark::internal::Benchmark* Register(const std::string& name, std::function<void(benchmark::State&)> body,
+                                         int iterations = 0)
 {
-    return benchmark::RegisterBenchmark(name.c_str(), [body](benchmark::State& state) { body(state); })
-        ->UseRealTime()
-        ->MinTime(kMinTime)
-        ->Unit(benchmark::kMicrosecond);
+    auto* registered = benchmark::RegisterBenchmark(name.c_str(), [body](benchmark::State& state) { body(state); })
+                           ->UseRealTime()
+                           ->Unit(benchmark::kMicrosecond);
+    if (iterations > 0) {
+        registered->Iterations(iterations);  // a fixed count excludes a minimum time
+    } else {
+        registered->MinTime(kMinTime);
+    }
+    return registered;
 }
 
 // ---------------------------------------------------------------- writes
@@ -299,48 +305,52 @@ void RegisterWrites(const Location& location)
 void RegisterQuery(const std::string& prefix, const std::string& path, const std::string& sql, int rows,
                    std::function<int(DADatabase&, DACursor&)> call, int iterations)
 {
-    auto tune = [iterations](benchmark::internal::Benchmark* b) {
-        if (iterations > 0) {
-            b->Iterations(iterations);
-        }
-    };
-    tune(Register(prefix + "lib", [call, rows](benchmark::State& state) {
-        DADatabase db;
-        for (auto _ : state) {
-            DACursor cursor;
-            const int rc = call(db, cursor);
-            if (rc != SQLITE_OK || cursor.GetCount() != rows) {
-                Fail(state, "library query", rc);
-                break;
+    Register(
+        prefix + "lib",
+        [call, rows](benchmark::State& state) {
+            DADatabase db;
+            for (auto _ : state) {
+                DACursor cursor;
+                const int rc = call(db, cursor);
+                if (rc != SQLITE_OK || cursor.GetCount() != rows) {
+                    Fail(state, "library query", rc);
+                    break;
+                }
             }
-        }
-        state.counters["rows"] = rows;
-        state.SetItemsProcessed(state.iterations() * rows);
-    }));
-    tune(Register(prefix + "raw", [path, sql, rows](benchmark::State& state) {
-        for (auto _ : state) {
-            bench::RawColumns columns;
-            const int rc = bench::RawSelect(path, sql, columns);
-            if (rc != SQLITE_OK || columns.empty() || columns[0].size() != static_cast<std::size_t>(rows)) {
-                Fail(state, "raw query", rc);
-                break;
+            state.counters["rows"] = rows;
+            state.SetItemsProcessed(state.iterations() * rows);
+        },
+        iterations);
+    Register(
+        prefix + "raw",
+        [path, sql, rows](benchmark::State& state) {
+            for (auto _ : state) {
+                bench::RawColumns columns;
+                const int rc = bench::RawSelect(path, sql, columns);
+                if (rc != SQLITE_OK || columns.empty() || columns[0].size() != static_cast<std::size_t>(rows)) {
+                    Fail(state, "raw query", rc);
+                    break;
+                }
             }
-        }
-        state.counters["rows"] = rows;
-        state.SetItemsProcessed(state.iterations() * rows);
-    }));
-    tune(Register(prefix + "sqlitecpp", [path, sql, rows](benchmark::State& state) {
-        for (auto _ : state) {
-            bench::RawColumns columns;
-            const int rc = bench::SqliteCppSelect(path, sql, columns);
-            if (rc != 0 || columns.empty() || columns[0].size() != static_cast<std::size_t>(rows)) {
-                Fail(state, "SQLiteCpp query", rc);
-                break;
+            state.counters["rows"] = rows;
+            state.SetItemsProcessed(state.iterations() * rows);
+        },
+        iterations);
+    Register(
+        prefix + "sqlitecpp",
+        [path, sql, rows](benchmark::State& state) {
+            for (auto _ : state) {
+                bench::RawColumns columns;
+                const int rc = bench::SqliteCppSelect(path, sql, columns);
+                if (rc != 0 || columns.empty() || columns[0].size() != static_cast<std::size_t>(rows)) {
+                    Fail(state, "SQLiteCpp query", rc);
+                    break;
+                }
             }
-        }
-        state.counters["rows"] = rows;
-        state.SetItemsProcessed(state.iterations() * rows);
-    }));
+            state.counters["rows"] = rows;
+            state.SetItemsProcessed(state.iterations() * rows);
+        },
+        iterations);
 }
 
 void RegisterQueries(const Location& location, const std::vector<int>& sizes)
