@@ -1,5 +1,8 @@
 #include "DADatabaseParser.h"
 
+#include <string>
+#include <vector>
+
 #include "DABusyRetry.h"
 #include "DALog.h"
 
@@ -58,6 +61,11 @@ void DADatabaseParser::ParseDatabase(sqlite3* db, sqlite3_stmt* stmt, DACursor& 
     DABusyRetry<DADatabaseParser> retry(*this);
     bool registered = false;
     int columnCount = 0;
+    // The column names, copied once from the first row: SQLite's name of a
+    // column does not change while a statement prepared by sqlite3_prepare
+    // runs, and asking for it again for every value costs a lock of the
+    // connection's mutex each time.
+    std::vector<std::string> names;
     for (;;) {
         const int rc = sqlite3_step(stmt);
         if (rc == SQLITE_DONE || retry.Stopped()) {
@@ -73,13 +81,15 @@ void DADatabaseParser::ParseDatabase(sqlite3* db, sqlite3_stmt* stmt, DACursor& 
         }
         if (!registered) {
             columnCount = sqlite3_column_count(stmt);
+            names.reserve(static_cast<std::size_t>(columnCount));
             for (int i = 0; i < columnCount; ++i) {
-                cursor.SetColumn(TextOrEmpty(sqlite3_column_name(stmt, i)));
+                names.emplace_back(TextOrEmpty(sqlite3_column_name(stmt, i)));
+                cursor.SetColumn(names.back().c_str());
             }
             registered = true;
         }
         for (int i = 0; i < columnCount; ++i) {
-            const char* name = TextOrEmpty(sqlite3_column_name(stmt, i));
+            const char* name = names[static_cast<std::size_t>(i)].c_str();
             switch (sqlite3_column_type(stmt, i)) {
             case SQLITE_INTEGER:
             case SQLITE_FLOAT:
