@@ -25,19 +25,17 @@ struct LockName {
 int DAMemberLock::FormatName(const void* member, char (&name)[kNameSize])
 {
     // Hand-written rather than snprintf("%x"): the same text, but this runs
-    // once for every value a query stores, so it must be cheap.
+    // once for every value a query stores, so it must be cheap. The digits
+    // are counted first and then written in place from the last one.
     static const char digits[] = "0123456789abcdef";
     auto address = reinterpret_cast<std::uintptr_t>(member);
-    char reversed[sizeof address * 2];
-    int length = 0;
-    do {
-        reversed[length++] = digits[address & 0xFU];
-        address >>= 4U;
-    } while (address != 0);
-    for (int i = 0; i < length; ++i) {
-        name[i] = reversed[length - 1 - i];
-    }
+    constexpr int kBits = static_cast<int>(sizeof(unsigned long long) * 8);
+    const int length = address == 0 ? 1 : (kBits - __builtin_clzll(address) + 3) / 4;
     name[length] = '\0';
+    for (int i = length; i-- > 0;) {
+        name[i] = digits[address & 0xFU];
+        address >>= 4U;
+    }
     return length;
 }
 
