@@ -8,19 +8,25 @@
 
 namespace {
 
-// Formatted extraction from a fresh default stream: leading blanks are
-// skipped, trailing text is ignored, end of input alone is no failure.
+// The conversion step of GetInt and GetDouble, given the current value (null
+// when the lookup already failed and logged): formatted extraction from a
+// fresh default stream, so leading blanks are skipped, trailing text is
+// ignored and end of input alone is no failure. Logs a failure under func.
 template <typename Number>
-bool ReadNumber(const std::string& text, Number& out)
+int ReadNumber(const std::string* text, Number& out, const char* func, const char* failure)
 {
-    std::istringstream stream(text);
+    if (text == nullptr) {
+        return 1;
+    }
+    std::istringstream stream(*text);
     Number number{};
     stream >> number;
     if (stream.fail()) {
-        return false;
+        DA_LOG_AT(DLOG_ERROR, func, "%s", failure);
+        return 1;
     }
     out = number;
-    return true;
+    return 0;
 }
 
 }  // namespace
@@ -161,26 +167,10 @@ int DACursor::GetString(const char* column, std::string& value)
 
 int DACursor::GetInt(const char* column, int& value)
 {
-    const std::string* current = CurrentValue(column, __func__);
-    if (current == nullptr) {
-        return 1;
-    }
-    if (!ReadNumber(*current, value)) {
-        DA_LOG(DLOG_ERROR, "CONVERT TO INT ERROR!!!");
-        return 1;
-    }
-    return 0;
+    return ReadNumber(CurrentValue(column, __func__), value, __func__, "CONVERT TO INT ERROR!!!");
 }
 
 int DACursor::GetDouble(const char* column, double& value)
 {
-    const std::string* current = CurrentValue(column, __func__);
-    if (current == nullptr) {
-        return 1;
-    }
-    if (!ReadNumber(*current, value)) {
-        DA_LOG(DLOG_ERROR, "CONVERT TO DOUBLE ERROR!!!");
-        return 1;
-    }
-    return 0;
+    return ReadNumber(CurrentValue(column, __func__), value, __func__, "CONVERT TO DOUBLE ERROR!!!");
 }
