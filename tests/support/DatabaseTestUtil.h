@@ -16,11 +16,13 @@
 #include "DACursor.h"
 #include "LogCapture.h"
 
+using Strings = std::vector<std::string>;
+
 // Every captured line as "priority file:function > message", so a whole log
 // can be compared at once with a readable difference.
-inline std::vector<std::string> Described(const LogCapture& log)
+inline Strings Described(const LogCapture& log)
 {
-    std::vector<std::string> out;
+    Strings out;
     for (const LogLine& line : log.Lines()) {
         out.push_back(std::to_string(line.priority) + " " + line.file + ":" + line.function + " > " + line.message);
     }
@@ -28,9 +30,9 @@ inline std::vector<std::string> Described(const LogCapture& log)
 }
 
 // The busy warnings "SQLITE BUSY[1]".."SQLITE BUSY[n]" written from file.
-inline std::vector<std::string> BusyWarnings(const std::string& file, int n)
+inline Strings BusyWarnings(const std::string& file, int n)
 {
-    std::vector<std::string> out;
+    Strings out;
     for (int i = 1; i <= n; ++i) {
         out.push_back("5 " + file + ":IsRetryLimit > SQLITE BUSY[" + std::to_string(i) + "]");
     }
@@ -38,9 +40,9 @@ inline std::vector<std::string> BusyWarnings(const std::string& file, int n)
 }
 
 // The values of column row by row, walking the cursor from its start.
-inline std::vector<std::string> ColumnValues(DACursor& cursor, const char* column)
+inline Strings ColumnValues(DACursor& cursor, const char* column)
 {
-    std::vector<std::string> values;
+    Strings values;
     cursor.MoveToFirst();
     while (cursor.MoveToNext() == 0) {
         std::string value;
