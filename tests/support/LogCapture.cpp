@@ -57,15 +57,6 @@ std::vector<LogLine> LogCapture::Lines() const
     return m_lines;
 }
 
-std::vector<std::string> LogCapture::Messages() const
-{
-    std::vector<std::string> messages;
-    for (const LogLine& entry : Lines()) {
-        messages.push_back(entry.message);
-    }
-    return messages;
-}
-
 int LogCapture::Count(const std::string& message) const
 {
     int count = 0;

@@ -29,8 +29,6 @@ public:
     LogCapture& operator=(const LogCapture&) = delete;
 
     std::vector<LogLine> Lines() const;
-    // The messages only, in order.
-    std::vector<std::string> Messages() const;
     // How many lines carry exactly this message.
     int Count(const std::string& message) const;
     void Clear();
