@@ -1,5 +1,6 @@
 #include "DACursor.h"
 
+#include <functional>
 #include <string>
 #include <type_traits>
 #include <vector>
@@ -28,58 +29,80 @@ void Load(DACursor& cursor, const std::vector<const char*>& names, const std::ve
     }
 }
 
-// Three rows of two columns, registered in the order b, a.
-void LoadThreeRows(DACursor& cursor)
-{
-    Load(cursor, {"b", "a"}, {{"b0", "a0"}, {"b1", "a1"}, {"b2", "a2"}});
-}
-
 std::string Line(int priority, const char* function, const char* message)
 {
     return std::to_string(priority) + " DACursor.cpp:" + function + " > " + message;
 }
 
-std::vector<std::string> Names(DACursor& cursor)
+const std::string kLastRow = Line(4, "MoveToNext", "Last Row");
+const std::string kFirstRow = Line(4, "MoveToPrev", "First Row");
+const std::string kInvalid = Line(6, "MoveToPosition", "Invalid Position");
+
+// One move and what it must give: its result (kVoid for MoveToFirst and
+// MoveToLast, which return nothing) and the position afterwards.
+enum Move { kNext, kPrev, kFirst, kLast, kTo };
+constexpr int kVoid = -100;
+struct Step {
+    Move move;
+    int rc;
+    int position;
+    int row = 0;  // for kTo
+};
+
+void Walk(DACursor& cursor, const std::vector<Step>& steps)
 {
-    std::vector<std::string> names{"stale"};
-    cursor.GetColumn(names);
-    return names;
+    const std::function<int(DACursor&, int)> moves[] = {
+        [](DACursor& c, int) { return c.MoveToNext(); },
+        [](DACursor& c, int) { return c.MoveToPrev(); },
+        [](DACursor& c, int) { return c.MoveToFirst(), kVoid; },
+        [](DACursor& c, int) { return c.MoveToLast(), kVoid; },
+        [](DACursor& c, int row) { return c.MoveToPosition(row); },
+    };
+    for (std::size_t i = 0; i < steps.size(); ++i) {
+        EXPECT_EQ(steps[i].rc, moves[steps[i].move](cursor, steps[i].row)) << "step " << i;
+        EXPECT_EQ(steps[i].position, cursor.GetPosition()) << "step " << i;
+    }
 }
 
 }  // namespace
 
-TEST(DACursorStorage, EmptyCursor)
+TEST(DACursorNavigation, EmptyCursor)
 {
     LogCapture log;
     DACursor cursor;
-    std::vector<std::string> names{"kept"};
+    Strings names{"kept"};
     EXPECT_EQ(-1, cursor.GetCount());
     EXPECT_EQ(1, cursor.GetColumn(names));
-    EXPECT_EQ(std::vector<std::string>{"kept"}, names);
-    EXPECT_EQ(-1, cursor.GetPosition());
+    EXPECT_EQ(Strings{"kept"}, names);
     EXPECT_FALSE(cursor.IsValidPosition(0));
-    EXPECT_EQ(1, cursor.MoveToPosition(0));
-    EXPECT_EQ(3, cursor.MoveToNext());
-    EXPECT_EQ(-2, cursor.GetPosition());
-    cursor.MoveToFirst();
-    EXPECT_EQ(2, cursor.MoveToPrev());
-    EXPECT_EQ(0, cursor.GetPosition());
-    cursor.MoveToLast();
-    EXPECT_EQ(-1, cursor.GetPosition());
-    EXPECT_EQ((std::vector<std::string>{Line(6, "MoveToPosition", "Invalid Position"),
-                                        Line(4, "MoveToNext", "Last Row"), Line(4, "MoveToPrev", "First Row")}),
-              Described(log));
+    Walk(cursor, {{kTo, 1, -1}, {kNext, 3, -2}, {kFirst, kVoid, -1}, {kPrev, 2, 0}, {kLast, kVoid, -1}});
+    EXPECT_EQ((Strings{kInvalid, kLastRow, kFirstRow}), Described(log));
 }
 
-TEST(DACursorStorage, ColumnsInRegistrationOrderUntilInitialize)
+TEST(DACursorNavigation, ThreeRowsThenInitialize)
 {
+    LogCapture log;
     DACursor cursor;
-    LoadThreeRows(cursor);
+    Load(cursor, {"b", "a"}, {{"b0", "a0"}, {"b1", "a1"}, {"b2", "a2"}});
+    Strings names;
+    EXPECT_EQ(0, cursor.GetColumn(names));
+    EXPECT_EQ((Strings{"b", "a"}), names);  // registration order
     EXPECT_EQ(3, cursor.GetCount());
-    EXPECT_EQ((std::vector<std::string>{"b", "a"}), Names(cursor));
-    ASSERT_EQ(0, cursor.MoveToPosition(2));
+    Walk(cursor, {{kNext, 0, 0}, {kNext, 0, 1}, {kNext, 0, 2}, {kNext, 3, 2}, {kNext, 3, 2}, {kLast, kVoid, 3}});
+    std::string value = "untouched";
+    EXPECT_EQ(1, cursor.GetString("a", value));  // after the last row
+    EXPECT_EQ("untouched", value);
+    Walk(cursor, {{kPrev, 0, 2}, {kPrev, 0, 1}, {kPrev, 0, 0}, {kPrev, 2, 0}, {kFirst, kVoid, -1}, {kPrev, 2, 0}});
+    Walk(cursor, {{kLast, kVoid, 3}, {kNext, 3, 2}, {kTo, 0, 1, 1}, {kTo, 1, 1, 3}, {kTo, 1, 1, -1}});
+    EXPECT_EQ((Strings{kLastRow, kLastRow, Line(6, "GetString", "CURSOR RANGE ERROR!!!"), kFirstRow, kFirstRow,
+                       kLastRow, kInvalid, kInvalid}),
+              Described(log));
+    EXPECT_FALSE(cursor.IsValidPosition(-1));
+    EXPECT_TRUE(cursor.IsValidPosition(0));
+    EXPECT_TRUE(cursor.IsValidPosition(2));
+    EXPECT_FALSE(cursor.IsValidPosition(3));
+
     cursor.Initialize();
-    std::vector<std::string> names{"kept"};
     EXPECT_EQ(-1, cursor.GetCount());
     EXPECT_EQ(1, cursor.GetColumn(names));
     EXPECT_EQ(-1, cursor.GetPosition());
@@ -120,15 +143,11 @@ TEST(DACursorStorage, NameRegisteredTwiceSortingSecondDoublesCount)
     DACursor cursor;
     Load(cursor, {"a", "id", "z", "id"}, {{"a0", "1", "z0", "7"}, {"a1", "2", "z1", "8"}});
     EXPECT_EQ(4, cursor.GetCount());
-
-    ASSERT_EQ(0, cursor.MoveToPosition(3));
+    EXPECT_EQ((Strings{"1", "7", "2", "8"}), ColumnValues(cursor, "id"));  // ends on row 3
     std::string value = "untouched";
-    EXPECT_EQ(0, cursor.GetString("id", value));
-    EXPECT_EQ("8", value);
-    value = "untouched";
     EXPECT_EQ(1, cursor.GetString("a", value));
     EXPECT_EQ("untouched", value);
-    EXPECT_EQ((std::vector<std::string>{Line(6, "GetString", "CURSOR RANGE ERROR!!!")}), Described(log));
+    EXPECT_EQ((Strings{kLastRow, Line(6, "GetString", "CURSOR RANGE ERROR!!!")}), Described(log));
 }
 
 TEST(DACursorStorage, RegisteringAgainKeepsValuesAndUnknownNamesStoreNothing)
@@ -139,87 +158,18 @@ TEST(DACursorStorage, RegisteringAgainKeepsValuesAndUnknownNamesStoreNothing)
     cursor.SetColumn("b");
     cursor.SetData("nobody", "x");
     EXPECT_EQ(2, cursor.GetCount());
-    EXPECT_EQ((std::vector<std::string>{"a", "b", "b"}), Names(cursor));
-
-    ASSERT_EQ(0, cursor.MoveToPosition(1));
-    std::string value = "untouched";
-    EXPECT_EQ(0, cursor.GetString("b", value));
-    EXPECT_EQ("", value);  // an empty value is a value
-    EXPECT_TRUE(log.Lines().empty());
-}
-
-TEST(DACursorNavigation, ForwardWalkStopsOnLastRow)
-{
-    LogCapture log;
-    DACursor cursor;
-    LoadThreeRows(cursor);
-    for (int row = 0; row < 3; ++row) {
-        EXPECT_EQ(0, cursor.MoveToNext());
-        EXPECT_EQ(row, cursor.GetPosition());
-    }
-    EXPECT_TRUE(log.Lines().empty());
-    EXPECT_EQ(3, cursor.MoveToNext());
-    EXPECT_EQ(2, cursor.GetPosition());
-    EXPECT_EQ(3, cursor.MoveToNext());
-    EXPECT_EQ(2, cursor.GetPosition());
-    EXPECT_EQ((std::vector<std::string>{Line(4, "MoveToNext", "Last Row"), Line(4, "MoveToNext", "Last Row")}),
-              Described(log));
-}
-
-TEST(DACursorNavigation, BackwardWalkFromAfterTheLastRow)
-{
-    LogCapture log;
-    DACursor cursor;
-    LoadThreeRows(cursor);
-    cursor.MoveToLast();
-    EXPECT_EQ(3, cursor.GetPosition());
-    std::string value = "untouched";
-    EXPECT_EQ(1, cursor.GetString("a", value));
-    EXPECT_EQ("untouched", value);
-    EXPECT_EQ(0, cursor.MoveToPrev());
-    EXPECT_EQ(2, cursor.GetPosition());
-    EXPECT_EQ(0, cursor.MoveToPrev());
-    EXPECT_EQ(0, cursor.MoveToPrev());
-    EXPECT_EQ(0, cursor.GetPosition());
-    EXPECT_EQ(2, cursor.MoveToPrev());
-    EXPECT_EQ(0, cursor.GetPosition());
-
-    cursor.MoveToFirst();
-    EXPECT_EQ(-1, cursor.GetPosition());
-    EXPECT_EQ(2, cursor.MoveToPrev());
-    EXPECT_EQ(0, cursor.GetPosition());
-    EXPECT_EQ((std::vector<std::string>{Line(6, "GetString", "CURSOR RANGE ERROR!!!"),
-                                        Line(4, "MoveToPrev", "First Row"), Line(4, "MoveToPrev", "First Row")}),
-              Described(log));
-
-    cursor.MoveToLast();
-    EXPECT_EQ(3, cursor.MoveToNext());  // already past the end
-    EXPECT_EQ(2, cursor.GetPosition());
-}
-
-TEST(DACursorNavigation, MoveToPositionAcceptsOnlyRowsInsideTheCount)
-{
-    LogCapture log;
-    DACursor cursor;
-    LoadThreeRows(cursor);
-    EXPECT_EQ(0, cursor.MoveToPosition(2));
-    EXPECT_EQ(2, cursor.GetPosition());
-    EXPECT_EQ(1, cursor.MoveToPosition(3));
-    EXPECT_EQ(1, cursor.MoveToPosition(-1));
-    EXPECT_EQ(2, cursor.GetPosition());
-    EXPECT_EQ((std::vector<std::string>{Line(6, "MoveToPosition", "Invalid Position"),
-                                        Line(6, "MoveToPosition", "Invalid Position")}),
-              Described(log));
-    EXPECT_FALSE(cursor.IsValidPosition(-1));
-    EXPECT_TRUE(cursor.IsValidPosition(0));
-    EXPECT_FALSE(cursor.IsValidPosition(3));
+    Strings names;
+    EXPECT_EQ(0, cursor.GetColumn(names));
+    EXPECT_EQ((Strings{"a", "b", "b"}), names);
+    EXPECT_EQ((Strings{"b0", ""}), ColumnValues(cursor, "b"));  // an empty value is a value
+    EXPECT_EQ(Strings{kLastRow}, Described(log));  // from the walk to the end
 }
 
 TEST(DACursorRead, NameIsCheckedBeforePosition)
 {
     LogCapture log;
     DACursor cursor;
-    LoadThreeRows(cursor);
+    Load(cursor, {"a"}, {{"a0"}});
     std::string text = "untouched";
     int number = 17;
     double real = 1.5;
@@ -229,65 +179,43 @@ TEST(DACursorRead, NameIsCheckedBeforePosition)
     EXPECT_EQ("untouched", text);
     EXPECT_EQ(17, number);
     EXPECT_EQ(1.5, real);
-    EXPECT_EQ((std::vector<std::string>{Line(6, "GetString", "NO MATCHED ERROR!!!"),
-                                        Line(6, "GetInt", "CURSOR RANGE ERROR!!!"),
-                                        Line(6, "GetDouble", "NO MATCHED ERROR!!!")}),
+    EXPECT_EQ((Strings{Line(6, "GetString", "NO MATCHED ERROR!!!"), Line(6, "GetInt", "CURSOR RANGE ERROR!!!"),
+                       Line(6, "GetDouble", "NO MATCHED ERROR!!!")}),
               Described(log));
 }
 
-struct ConversionCase {
-    const char* text;
-    bool doubleOk;
-    int asInt;
-    double asDouble;
-};
-
-void PrintTo(const ConversionCase& c, std::ostream* os)
-{
-    *os << '"' << c.text << '"';
-}
-
-class DACursorConversion : public ::testing::TestWithParam<ConversionCase> {};
-
 // Each value is read as int and as double from a one-row cursor; a failed read
-// logs its conversion error and leaves the output as it was.
-TEST_P(DACursorConversion, IntAndDouble)
+// logs its conversion error and leaves the output as it was (-99 / -99.5).
+TEST(DACursorRead, IntAndDoubleConversions)
 {
-    const ConversionCase& c = GetParam();
-    DACursor cursor;
-    Load(cursor, {"v"}, {{c.text}});
-    ASSERT_EQ(0, cursor.MoveToNext());
-    int number = -99;
-    double real = -99.5;
-    LogCapture log;
-
-    const int intResult = cursor.GetInt("v", number);
-    const int doubleResult = cursor.GetDouble("v", real);
-
-    std::vector<std::string> expectedLog;
-    if (c.asInt == -99) {
-        EXPECT_EQ(1, intResult);
-        expectedLog.push_back(Line(6, "GetInt", "CONVERT TO INT ERROR!!!"));
-    } else {
-        EXPECT_EQ(0, intResult);
+    const struct {
+        const char* text;
+        int asInt;
+        double asDouble;
+    } cases[] = {{"42", 42, 42.0},    {" 42", 42, 42.0}, {"42abc", 42, 42.0}, {"-7", -7, -7.0},
+                 {"3.9", 3, 3.9},     {"3.5", 3, 3.5},   {"1e3", 1, 1000.0},  {"2147483648", -99, 2147483648.0},
+                 {"abc", -99, -99.5}, {"", -99, -99.5}};
+    for (const auto& c : cases) {
+        SCOPED_TRACE(std::string("\"") + c.text + "\"");
+        DACursor cursor;
+        Load(cursor, {"v"}, {{c.text}});
+        ASSERT_EQ(0, cursor.MoveToNext());
+        int number = -99;
+        double real = -99.5;
+        LogCapture log;
+        const bool intOk = c.asInt != -99;
+        const bool doubleOk = c.asDouble != -99.5;
+        EXPECT_EQ(intOk ? 0 : 1, cursor.GetInt("v", number));
+        EXPECT_EQ(doubleOk ? 0 : 1, cursor.GetDouble("v", real));
+        EXPECT_EQ(c.asInt, number);
+        EXPECT_DOUBLE_EQ(c.asDouble, real);
+        Strings expectedLog;
+        if (!intOk) {
+            expectedLog.push_back(Line(6, "GetInt", "CONVERT TO INT ERROR!!!"));
+        }
+        if (!doubleOk) {
+            expectedLog.push_back(Line(6, "GetDouble", "CONVERT TO DOUBLE ERROR!!!"));
+        }
+        EXPECT_EQ(expectedLog, Described(log));
     }
-    EXPECT_EQ(c.asInt, number);
-    if (c.doubleOk) {
-        EXPECT_EQ(0, doubleResult);
-    } else {
-        EXPECT_EQ(1, doubleResult);
-        expectedLog.push_back(Line(6, "GetDouble", "CONVERT TO DOUBLE ERROR!!!"));
-    }
-    EXPECT_DOUBLE_EQ(c.asDouble, real);
-    EXPECT_EQ(expectedLog, Described(log));
 }
-
-// asInt -99 / asDouble -99.5 mean "read failed, output untouched".
-INSTANTIATE_TEST_SUITE_P(Values, DACursorConversion,
-                         ::testing::Values(ConversionCase{"42", true, 42, 42.0}, ConversionCase{" 42", true, 42, 42.0},
-                                           ConversionCase{"42abc", true, 42, 42.0},
-                                           ConversionCase{"-7", true, -7, -7.0}, ConversionCase{"3.9", true, 3, 3.9},
-                                           ConversionCase{"3.5", true, 3, 3.5}, ConversionCase{"1e3", true, 1, 1000.0},
-                                           ConversionCase{"2147483648", true, -99, 2147483648.0},
-                                           ConversionCase{"abc", false, -99, -99.5},
-                                           ConversionCase{"", false, -99, -99.5}));
