@@ -62,6 +62,11 @@ protected:
 
 const std::string kParser = "DADatabasePasrser.cpp";
 
+std::string Error(const std::string& function, const std::string& message)
+{
+    return "6 " + kParser + ":" + function + " > " + message;
+}
+
 }  // namespace
 
 TEST_F(DADatabaseParserTest, ParseExistTableReadsTheCount)
@@ -101,7 +106,7 @@ TEST_F(DADatabaseParserTest, ParseExistTableStepsOnceMoreAfterAnError)
     EXPECT_EQ(SQLITE_ROW, rc);
     EXPECT_EQ(4, m_calls);
     EXPECT_TRUE(exists);
-    EXPECT_EQ((std::vector<std::string>{"6 " + kParser + ":ParseExistTable > SQLITE STEP ERROR!!!"}), Described(log));
+    EXPECT_EQ((Strings{Error("ParseExistTable", "SQLITE STEP ERROR!!!")}), Described(log));
 }
 
 TEST_F(DADatabaseParserTest, ParseDatabaseStoresValuesAsSqliteText)
@@ -113,33 +118,19 @@ TEST_F(DADatabaseParserTest, ParseDatabaseStoresValuesAsSqliteText)
                          Prepare("SELECT 42 AS i, 2.5 AS r, NULL AS n, x'0102' AS b, 'txt' AS t, "
                                  "'' AS e, 1 AS i UNION ALL SELECT -3, 1e20, 'x', 'y', 'z', 'w', 2"),
                          cursor);
-    std::vector<std::string> names;
+    Strings names;
     EXPECT_EQ(0, cursor.GetColumn(names));
-    EXPECT_EQ((std::vector<std::string>{"i", "r", "n", "b", "t", "e", "i"}), names);
+    EXPECT_EQ((Strings{"i", "r", "n", "b", "t", "e", "i"}), names);
     EXPECT_EQ(-1, cursor.GetPosition());
-    EXPECT_EQ((std::vector<std::string>{"6 " + kParser + ":ParseDatabase > UNKNOWN TYPE"}), Described(log));
+    EXPECT_EQ((Strings{Error("ParseDatabase", "UNKNOWN TYPE")}), Described(log));
     // i's one list holds 42, 1, -3, 2; the count (2) comes from e, so rows read 42, 1.
     EXPECT_EQ(2, cursor.GetCount());
-    EXPECT_EQ((std::vector<std::string>{"42", "1"}), ColumnValues(cursor, "i"));
-    EXPECT_EQ((std::vector<std::string>{"", "x"}), ColumnValues(cursor, "n"));
-    EXPECT_EQ((std::vector<std::string>{"", "y"}), ColumnValues(cursor, "b"));
-    EXPECT_EQ((std::vector<std::string>{"2.5", "1.0e+20"}), ColumnValues(cursor, "r"));
-    EXPECT_EQ((std::vector<std::string>{"txt", "z"}), ColumnValues(cursor, "t"));
-    EXPECT_EQ((std::vector<std::string>{"", "w"}), ColumnValues(cursor, "e"));
-}
-
-TEST_F(DADatabaseParserTest, ParseDatabaseEmptiesTheCursorWhenNoRowComes)
-{
-    DACursor cursor;
-    cursor.SetColumn("old");
-    cursor.SetData("old", "value");
-    ASSERT_EQ(0, cursor.MoveToNext());
-    DADatabaseParser parser;
-    parser.ParseDatabase(m_db->Handle(), Prepare("SELECT v FROM t WHERE v > 9"), cursor);
-    std::vector<std::string> names{"kept"};
-    EXPECT_EQ(1, cursor.GetColumn(names));
-    EXPECT_EQ(-1, cursor.GetCount());
-    EXPECT_EQ(-1, cursor.GetPosition());
+    EXPECT_EQ((Strings{"42", "1"}), ColumnValues(cursor, "i"));
+    EXPECT_EQ((Strings{"", "x"}), ColumnValues(cursor, "n"));
+    EXPECT_EQ((Strings{"", "y"}), ColumnValues(cursor, "b"));
+    EXPECT_EQ((Strings{"2.5", "1.0e+20"}), ColumnValues(cursor, "r"));
+    EXPECT_EQ((Strings{"txt", "z"}), ColumnValues(cursor, "t"));
+    EXPECT_EQ((Strings{"", "w"}), ColumnValues(cursor, "e"));
 }
 
 TEST_F(DADatabaseParserTest, ParseDatabaseKeepsRowsReadBeforeAStepError)
@@ -150,12 +141,11 @@ TEST_F(DADatabaseParserTest, ParseDatabaseKeepsRowsReadBeforeAStepError)
     parser.ParseDatabase(m_db->Handle(), Prepare("SELECT v, fail_on(3, v * 10) AS w FROM t"), cursor);
     // A statement from the legacy preparation reports a failed step with the
     // generic text; the function's own message comes only with a reset.
-    EXPECT_EQ((std::vector<std::string>{"6 " + kParser + ":ParseDatabase > SQLITE STEP ERROR!!! SQL logic error"}),
-              Described(log));
+    EXPECT_EQ((Strings{Error("ParseDatabase", "SQLITE STEP ERROR!!! SQL logic error")}), Described(log));
     EXPECT_EQ(4, m_calls);  // exactly one step after the error
     EXPECT_EQ(2, cursor.GetCount());
-    EXPECT_EQ((std::vector<std::string>{"1", "2"}), ColumnValues(cursor, "v"));
-    EXPECT_EQ((std::vector<std::string>{"10", "20"}), ColumnValues(cursor, "w"));
+    EXPECT_EQ((Strings{"1", "2"}), ColumnValues(cursor, "v"));
+    EXPECT_EQ((Strings{"10", "20"}), ColumnValues(cursor, "w"));
 }
 
 // A step result with no branch of its own (misuse, from a null statement) is
@@ -170,8 +160,8 @@ TEST_F(DADatabaseParserTest, UnexpectedStepResultEndsTheLoop)
     DACursor cursor;
     parser.ParseDatabase(m_db->Handle(), nullptr, cursor);
     EXPECT_EQ(-1, cursor.GetCount());
-    EXPECT_EQ((std::vector<std::string>{"6 " + kParser + ":ParseExistTable > SQLITE STEP ERROR!!!",
-                                        "6 " + kParser + ":ParseDatabase > SQLITE STEP ERROR!!! not an error"}),
+    EXPECT_EQ((Strings{Error("ParseExistTable", "SQLITE STEP ERROR!!!"),
+                       Error("ParseDatabase", "SQLITE STEP ERROR!!! not an error")}),
               Described(log));
 }
 
@@ -189,8 +179,8 @@ TEST_F(DADatabaseParserTest, BusyStepGivesUpAfterFifteenWaits)
     const double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
     holder.Run("COMMIT");
 
-    std::vector<std::string> expected = BusyWarnings(kParser, 15);
-    expected.push_back("6 " + kParser + ":IsRetryLimit > RETRY COUNT is reached LIMIT, SQLITE_BUSY");
+    Strings expected = BusyWarnings(kParser, 15);
+    expected.push_back(Error("IsRetryLimit", "RETRY COUNT is reached LIMIT, SQLITE_BUSY"));
     EXPECT_EQ(expected, Described(log));
     EXPECT_EQ(-1, cursor.GetCount());
     EXPECT_GE(seconds, 1.4);
