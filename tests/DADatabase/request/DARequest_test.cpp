@@ -1,0 +1,125 @@
+#include <cstring>
+#include <stdexcept>
+#include <string>
+#include <type_traits>
+
+#include <gtest/gtest.h>
+
+#include "DABasePath.h"
+#include "DABaseSet.h"
+#include "DACreateRequest.h"
+#include "DADeleteRequest.h"
+#include "DADropRequest.h"
+#include "DAJoinRequest.h"
+#include "DASelectRequest.h"
+#include "DAUpdateRequest.h"
+#include "DAUpsertRequest.h"
+#include "DatabaseTestUtil.h"
+#include "LogCapture.h"
+
+namespace {
+
+template <typename T>
+constexpr bool kNotCopyable = !std::is_copy_constructible<T>::value && !std::is_copy_assignable<T>::value;
+
+static_assert(kNotCopyable<DABasePath> && kNotCopyable<DABaseSet> && kNotCopyable<DASelectRequest> &&
+                  kNotCopyable<DAUpsertRequest> && kNotCopyable<DAUpdateRequest> && kNotCopyable<DADeleteRequest> &&
+                  kNotCopyable<DADropRequest> && kNotCopyable<DACreateRequest> && kNotCopyable<DAJoinRequest>,
+              "requests own raw copies of their names and must not be copied");
+
+// Every request class that names a table follows one SetTable/GetTable rule:
+// an unset name leaves the output alone, the name is copied at the call, a
+// null name keeps it and a new one replaces it.
+template <typename Request>
+class TableName : public ::testing::Test {
+};
+
+using TableRequests = ::testing::Types<DASelectRequest, DAUpsertRequest, DAUpdateRequest, DADeleteRequest,
+                                       DADropRequest, DACreateRequest>;
+TYPED_TEST_SUITE(TableName, TableRequests);
+
+TYPED_TEST(TableName, CopiedAtTheCallKeptOnNullReplacedOtherwise)
+{
+    TypeParam request;
+    std::string table = "caller's text";
+    request.SetTable(nullptr);
+    request.GetTable(table);
+    EXPECT_EQ(table, "caller's text");
+
+    char* buffer = new char[16];
+    std::strcpy(buffer, "contacts");
+    request.SetTable(buffer);
+    std::strcpy(buffer, "XXXXXXXX");
+    delete[] buffer;
+    request.SetTable(nullptr);
+    request.GetTable(table);
+    EXPECT_EQ(table, "contacts");
+
+    request.SetTable("");
+    request.GetTable(table);
+    EXPECT_EQ(table, "");
+}
+
+// A two-part getter reads its own pair once both parts are set (a null part
+// keeps what it held), and leaves its outputs alone until then.
+template <typename Request>
+void ExpectPairRule(void (Request::*set)(char const*, char const*), void (Request::*get)(std::string&, std::string&),
+                    void (Request::*other)(std::string&, std::string&))
+{
+    Request request;
+    std::string first = "a";
+    std::string second = "b";
+    (request.*set)("x", nullptr);
+    (request.*get)(first, second);
+    EXPECT_EQ(first + " " + second, "a b");
+    (request.*set)(nullptr, "y");
+    (request.*get)(first, second);
+    EXPECT_EQ(first + " " + second, "x y");
+    first = "a";
+    (request.*other)(first, second);
+    EXPECT_EQ(first + " " + second, "a y");
+}
+
+TEST(PairGetters, ReadOnlyTheirOwnPairOnceBothPartsAreSet)
+{
+    ExpectPairRule(&DACreateRequest::SetPrimaryKey, &DACreateRequest::GetPrimaryKey, &DACreateRequest::GetCompositeKey);
+    ExpectPairRule(&DACreateRequest::SetCompositeKey, &DACreateRequest::GetCompositeKey,
+                   &DACreateRequest::GetPrimaryKey);
+    ExpectPairRule(&DAJoinRequest::SetLeftJoin, &DAJoinRequest::GetLeftJoin, &DAJoinRequest::GetRightJoin);
+    ExpectPairRule(&DAJoinRequest::SetRightJoin, &DAJoinRequest::GetRightJoin, &DAJoinRequest::GetLeftJoin);
+}
+
+DAColumnList ColumnsOf(DACreateRequest& request)
+{
+    DAColumnList columns{{"stale", "TEXT"}};  // the getter must replace this
+    request.GetColumnKey(columns);
+    return columns;
+}
+
+TEST(DACreateRequest, ColumnsKeepCallOrderAndDuplicates)
+{
+    static const char x[] = "x";
+    static const char y[] = "y";
+    DACreateRequest request;
+    EXPECT_TRUE(ColumnsOf(request).empty());
+    request.SetColumnKey(x, "TEXT");
+    request.SetColumnKey(y, "INTEGER");
+    request.SetColumnKey(x, "");
+    // Pairs compare the name pointers, so both x entries hold x itself.
+    EXPECT_EQ(ColumnsOf(request), (DAColumnList{{x, "TEXT"}, {y, "INTEGER"}, {x, ""}}));
+}
+
+TEST(DACreateRequest, NullColumnIsRefusedAndNullTypeThrowsReleasingTheLock)
+{
+    static const char name[] = "name";
+    DACreateRequest request;
+    LogCapture log;
+    request.SetColumnKey(nullptr, "TEXT");
+    EXPECT_THROW(request.SetColumnKey(name, nullptr), std::logic_error);
+    EXPECT_TRUE(ColumnsOf(request).empty());
+    request.SetColumnKey(name, "TEXT");  // would deadlock if the lock were still held
+    EXPECT_EQ(ColumnsOf(request), (DAColumnList{{name, "TEXT"}}));
+    EXPECT_EQ(Strings{"6 DACreateRequest.cpp:SetColumnKey > NULL COLUMN NAME, COLUMN NOT ADDED"}, Described(log));
+}
+
+}  // namespace
