@@ -321,36 +321,30 @@ void RegisterQuery(const std::string& prefix, const std::string& path, const std
             state.SetItemsProcessed(state.iterations() * rows);
         },
         iterations);
-    Register(
-        prefix + "raw",
-        [path, sql, rows](benchmark::State& state) {
-            for (auto _ : state) {
-                bench::RawColumns columns;
-                const int rc = bench::RawSelect(path, sql, columns);
-                if (rc != SQLITE_OK || columns.empty() || columns[0].size() != static_cast<std::size_t>(rows)) {
-                    Fail(state, "raw query", rc);
-                    break;
+    // The two baselines differ only in the function that copies the rows.
+    const struct {
+        const char* suffix;
+        int (*copy)(const std::string&, const std::string&, bench::RawColumns&);
+        const char* what;
+    } baselines[] = {{"raw", &bench::RawSelect, "raw query"},
+                     {"sqlitecpp", &bench::SqliteCppSelect, "SQLiteCpp query"}};
+    for (const auto& baseline : baselines) {
+        Register(
+            prefix + baseline.suffix,
+            [path, sql, rows, copy = baseline.copy, what = baseline.what](benchmark::State& state) {
+                for (auto _ : state) {
+                    bench::RawColumns columns;
+                    const int rc = copy(path, sql, columns);
+                    if (rc != SQLITE_OK || columns.empty() || columns[0].size() != static_cast<std::size_t>(rows)) {
+                        Fail(state, what, rc);
+                        break;
+                    }
                 }
-            }
-            state.counters["rows"] = rows;
-            state.SetItemsProcessed(state.iterations() * rows);
-        },
-        iterations);
-    Register(
-        prefix + "sqlitecpp",
-        [path, sql, rows](benchmark::State& state) {
-            for (auto _ : state) {
-                bench::RawColumns columns;
-                const int rc = bench::SqliteCppSelect(path, sql, columns);
-                if (rc != 0 || columns.empty() || columns[0].size() != static_cast<std::size_t>(rows)) {
-                    Fail(state, "SQLiteCpp query", rc);
-                    break;
-                }
-            }
-            state.counters["rows"] = rows;
-            state.SetItemsProcessed(state.iterations() * rows);
-        },
-        iterations);
+                state.counters["rows"] = rows;
+                state.SetItemsProcessed(state.iterations() * rows);
+            },
+            iterations);
+    }
 }
 
 void RegisterQueries(const Location& location, const std::vector<int>& sizes)
