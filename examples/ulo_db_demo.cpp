@@ -111,30 +111,38 @@ void SetLocation(Request& request, const char* dir, const char* table)
     request.SetTable(table);
 }
 
-void CreateTables(DADatabase& db, DASqlGenerator& generator, const char* dir)
+// Shows the statement a write request stands for, runs it, and prints the
+// result, which every write of the demo expects to be 0.
+template <typename Request>
+void Write(DADatabase& db, const char* title, Request& request,
+           void (DASqlGenerator::*generate)(Request&, std::string&), int (DADatabase::*run)(Request&))
 {
     std::string sql;
+    (DASqlGenerator().*generate)(request, sql);
+    Step(title, sql);
+    Result((db.*run)(request), SQLITE_OK);
+}
+
+void CreateTables(DADatabase& db, const char* dir)
+{
     DACreateRequest groups;
     SetLocation(groups, dir, "groups");
     groups.SetPrimaryKey(kId, "INTEGER");
     groups.SetColumnKey(kTitle, "TEXT");
-    generator.GetCreateTableSql(groups, sql);
-    Step("Create the table groups (keyed by id)", sql);
-    Result(db.CreateTable(groups), SQLITE_OK);
+    Write(db, "Create the table groups (keyed by id)", groups, &DASqlGenerator::GetCreateTableSql,
+          &DADatabase::CreateTable);
 
     DACreateRequest contacts;
     SetLocation(contacts, dir, "contacts");
     contacts.SetPrimaryKey(kPhone, "TEXT");
     contacts.SetColumnKey(kName, "TEXT");
     contacts.SetColumnKey(kGroupId, "INTEGER");
-    generator.GetCreateTableSql(contacts, sql);
-    Step("Create the table contacts (keyed by phone, group_id refers to groups)", sql);
-    Result(db.CreateTable(contacts), SQLITE_OK);
+    Write(db, "Create the table contacts (keyed by phone, group_id refers to groups)", contacts,
+          &DASqlGenerator::GetCreateTableSql, &DADatabase::CreateTable);
 }
 
-void WriteRows(DADatabase& db, DASqlGenerator& generator, const char* dir)
+void WriteRows(DADatabase& db, const char* dir)
 {
-    std::string sql;
     const struct {
         int id;
         const char* title;
@@ -144,9 +152,7 @@ void WriteRows(DADatabase& db, DASqlGenerator& generator, const char* dir)
         SetLocation(upsert, dir, "groups");
         upsert.SetData(kId, group.id);
         upsert.SetData(kTitle, group.title);
-        generator.GetUpsertSql(upsert, sql);
-        Step("Upsert a group", sql);
-        Result(db.Upsert(upsert), SQLITE_OK);
+        Write(db, "Upsert a group", upsert, &DASqlGenerator::GetUpsertSql, &DADatabase::Upsert);
     }
 
     const struct {
@@ -160,25 +166,19 @@ void WriteRows(DADatabase& db, DASqlGenerator& generator, const char* dir)
         upsert.SetData(kPhone, contact.phone);
         upsert.SetData(kName, contact.name);
         upsert.SetData(kGroupId, contact.group);
-        generator.GetUpsertSql(upsert, sql);
-        Step("Upsert a contact", sql);
-        Result(db.Upsert(upsert), SQLITE_OK);
+        Write(db, "Upsert a contact", upsert, &DASqlGenerator::GetUpsertSql, &DADatabase::Upsert);
     }
 
     DAUpdateRequest update;
     SetLocation(update, dir, "contacts");
     update.SetData(kName, "Kim Min-ji");
     update.SetWhere(kPhone, "010-1111");
-    generator.GetUpdateSql(update, sql);
-    Step("Update Kim's name", sql);
-    Result(db.Update(update), SQLITE_OK);
+    Write(db, "Update Kim's name", update, &DASqlGenerator::GetUpdateSql, &DADatabase::Update);
 
     DADeleteRequest remove;
     SetLocation(remove, dir, "contacts");
     remove.SetWhere(kPhone, "010-3333");
-    generator.GetDeleteSql(remove, sql);
-    Step("Delete Park", sql);
-    Result(db.Delete(remove), SQLITE_OK);
+    Write(db, "Delete Park", remove, &DASqlGenerator::GetDeleteSql, &DADatabase::Delete);
 }
 
 void Query(DADatabase& db, DASqlGenerator& generator, const char* dir)
@@ -240,15 +240,11 @@ void CheckAndDrop(DADatabase& db, DASqlGenerator& generator, const char* dir)
     DACreateRequest notes;
     SetLocation(notes, dir, "notes");
     notes.SetColumnKey("body", "TEXT");
-    generator.GetCreateTableSql(notes, sql);
-    Step("Create a scratch table", sql);
-    Result(db.CreateTable(notes), SQLITE_OK);
+    Write(db, "Create a scratch table", notes, &DASqlGenerator::GetCreateTableSql, &DADatabase::CreateTable);
 
     DADropRequest drop;
     SetLocation(drop, dir, "notes");
-    generator.GetDropTableSql(drop, sql);
-    Step("Drop the scratch table", sql);
-    Result(db.DropTable(drop), SQLITE_OK);
+    Write(db, "Drop the scratch table", drop, &DASqlGenerator::GetDropTableSql, &DADatabase::DropTable);
 }
 
 }  // namespace
@@ -266,8 +262,8 @@ int main(int argc, char** argv)
     std::printf("libulo_db demo on %s/%s\n", dir, kFile);
     DADatabase db;
     DASqlGenerator generator;
-    CreateTables(db, generator, dir);
-    WriteRows(db, generator, dir);
+    CreateTables(db, dir);
+    WriteRows(db, dir);
     Query(db, generator, dir);
     CheckAndDrop(db, generator, dir);
 
