@@ -404,6 +404,30 @@ void RegisterQueries(const Location& location, const std::vector<int>& sizes)
 
 // ---------------------------------------------------------------- cursor walk
 
+// Times walk over data that load() prepares once: walk(sum, real, text)
+// reads every value of every row and returns how many reads failed.
+template <typename Load, typename Walk>
+void TimeWalk(benchmark::State& state, const Load& load, const Walk& walk)
+{
+    if (!load()) {
+        state.SkipWithError("load failed");
+    }
+    for (auto _ : state) {
+        long long sum = 0;
+        double real = 0;
+        std::string text;
+        const int failures = walk(sum, real, text);
+        benchmark::DoNotOptimize(sum);
+        benchmark::DoNotOptimize(real);
+        if (failures != 0) {
+            state.SkipWithError("a typed read failed");
+            break;
+        }
+    }
+    state.counters["rows"] = kWalkRows;
+    state.SetItemsProcessed(state.iterations() * kWalkRows);
+}
+
 // A full MoveToNext walk with a typed read per value, against the same
 // reads from the raw column vectors. The data is loaded once, untimed.
 void RegisterWalk(const Location& location)
@@ -432,14 +456,7 @@ void RegisterWalk(const Location& location)
     };
     const std::string prefix = "walk/" + std::to_string(kWalkRows) + "/memory/";
     Register(prefix + "lib", [data, load](benchmark::State& state) {
-        if (!load()) {
-            state.SkipWithError("load failed");
-        }
-        DACursor& cursor = data->cursor;
-        for (auto _ : state) {
-            long long sum = 0;
-            double real = 0;
-            std::string text;
+        TimeWalk(state, load, [&cursor = data->cursor](long long& sum, double& real, std::string& text) {
             int failures = 0;
             cursor.MoveToFirst();
             while (cursor.MoveToNext() == 0) {
@@ -454,25 +471,11 @@ void RegisterWalk(const Location& location)
                 failures += cursor.GetString("label", text);
                 sum += static_cast<long long>(text.size());
             }
-            benchmark::DoNotOptimize(sum);
-            benchmark::DoNotOptimize(real);
-            if (failures != 0) {
-                state.SkipWithError("typed read failed");
-                break;
-            }
-        }
-        state.counters["rows"] = kWalkRows;
-        state.SetItemsProcessed(state.iterations() * kWalkRows);
+            return failures;
+        });
     });
     Register(prefix + "raw", [data, load](benchmark::State& state) {
-        if (!load()) {
-            state.SkipWithError("load failed");
-        }
-        const bench::RawColumns& columns = data->columns;
-        for (auto _ : state) {
-            long long sum = 0;
-            double real = 0;
-            std::string text;
+        TimeWalk(state, load, [&columns = data->columns](long long& sum, double& real, std::string& text) {
             int failures = 0;
             const std::size_t rows = columns[0].size();
             for (std::size_t row = 0; row < rows; ++row) {
@@ -487,15 +490,8 @@ void RegisterWalk(const Location& location)
                 text = columns[3][row];
                 sum += static_cast<long long>(text.size());
             }
-            benchmark::DoNotOptimize(sum);
-            benchmark::DoNotOptimize(real);
-            if (failures != 0) {
-                state.SkipWithError("conversion failed");
-                break;
-            }
-        }
-        state.counters["rows"] = kWalkRows;
-        state.SetItemsProcessed(state.iterations() * kWalkRows);
+            return failures;
+        });
     });
 }
 
