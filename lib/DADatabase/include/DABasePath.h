@@ -5,9 +5,9 @@
 
 #include "DAOwnedString.h"
 
-// The database file a request applies to, as a directory and a file name.
-// Root class of every request; also used on its own for
-// DADatabase::CheckExistTable. Not copyable.
+/// The database file a request applies to, as a directory and a file name.
+/// Root class of every request; also used on its own for
+/// DADatabase::CheckExistTable. Not copyable.
 class DABasePath {
 public:
     DABasePath() = default;
@@ -16,14 +16,14 @@ public:
     DABasePath(const DABasePath&) = delete;
     DABasePath& operator=(const DABasePath&) = delete;
 
-    // Replaces the whole location with copies of dir and file. A null
-    // argument leaves its part unset, whatever it held before.
+    /// Replaces the whole location with copies of dir and file. A null
+    /// argument leaves its part unset, whatever it held before.
     void SetPath(char const* dir, char const* file);
 
-    // Assigns the directory to dir, then the file name to file.
-    // Throws std::logic_error when the directory is unset (before touching
-    // either output) or when the file name is unset (dir then already
-    // holds the directory).
+    /// Assigns the directory to dir, then the file name to file.
+    /// Throws std::logic_error when the directory is unset (before touching
+    /// either output) or when the file name is unset (dir then already
+    /// holds the directory).
     void GetPath(std::string& dir, std::string& file);
 
 private:

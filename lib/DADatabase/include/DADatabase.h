@@ -15,56 +15,60 @@
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
-// Runs requests against SQLite files. Every operation is one complete visit
-// to the file: open a connection (creating a missing file), build the
-// statement, run it, log, close, and return SQLite's result code (0 on
-// success, else the code of the step that failed). Nothing is kept between
-// calls; any number of threads may call at once, each call with its own
-// connection. Every connection and statement is released on every way out,
-// exceptions included.
-//
-// Busy-retry: each open, exec, prepare and step that returns SQLITE_BUSY is
-// repeated after a warning "SQLITE BUSY[n]" (n = 1..15) and a 100 ms pause;
-// then the error line "RETRY COUNT is reached LIMIT, SQLITE_BUSY" and one
-// last attempt whose result stands. No busy handler is set.
-//
-// Requests whose location lacks a directory or file name make the operation
-// throw std::logic_error before anything is opened.
+/// Runs requests against SQLite files. Every operation is one complete visit
+/// to the file: open a connection (creating a missing file), build the
+/// statement, run it, log, close, and return SQLite's result code (0 on
+/// success, else the code of the step that failed). Nothing is kept between
+/// calls; any number of threads may call at once, each call with its own
+/// connection. Every connection and statement is released on every way out,
+/// exceptions included.
+///
+/// Busy-retry: each open, exec, prepare and step that returns SQLITE_BUSY is
+/// repeated after a warning "SQLITE BUSY[n]" (n = 1..15) and a 100 ms pause;
+/// then the error line "RETRY COUNT is reached LIMIT, SQLITE_BUSY" and one
+/// last attempt whose result stands. No busy handler is set.
+///
+/// Requests whose location lacks a directory or file name make the operation
+/// throw std::logic_error before anything is opened.
 class DADatabase {
 public:
     DADatabase() = default;
     ~DADatabase() = default;
 
-    // Opens dir/file under busy-retry. On 0, db is open and the caller
-    // closes it with sqlite3_close. Otherwise logs "DB open failed. Error
-    // no(rc): text", leaves db null and returns the code (14 when the
-    // directory does not exist; no file is created then).
+    /// Opens dir/file under busy-retry. On 0, db is open and the caller
+    /// closes it with sqlite3_close. Otherwise logs "DB open failed. Error
+    /// no(rc): text", leaves db null and returns the code (14 when the
+    /// directory does not exist; no file is created then).
     int OpenDB(sqlite3*& db, std::string dir, std::string file);
 
-    // The busy-retry step: see DADatabaseParser::IsRetryLimit.
+    /// The busy-retry step: see DADatabaseParser::IsRetryLimit.
     bool IsRetryLimit(int& count);
 
-    // Write operations. Each logs "<word> SUCCESS[0]" (info) or
-    // "<word> FAILED[rc]: SQLite's text" (error), with the words
-    // "DropTable", "update", "delete", "Upsert", "createTable". When the
-    // open fails only OpenDB's line is written.
+    ///@{
+    /// Write operations. Each logs "<word> SUCCESS[0]" (info) or
+    /// "<word> FAILED[rc]: SQLite's text" (error), with the words
+    /// "DropTable", "update", "delete", "Upsert", "createTable". When the
+    /// open fails only OpenDB's line is written.
     int DropTable(DADropRequest& request);
     int Update(DAUpdateRequest& request);
     int Delete(DADeleteRequest& request);
     int Upsert(DAUpsertRequest& request);
     int CreateTable(DACreateRequest& request);
+    ///@}
 
-    // Queries. Return the open's code if it failed, else the preparation's
-    // code; step failures are logged by the parser but not returned. When
-    // the open or the preparation fails, cursor / exists are left as they
-    // were and the failure line is "SELECT FAILED[rc]: text",
-    // "JoinSelect FAILED[rc]: text" or "CheckExistTable FAILED[rc]: text".
-    // Select also logs "OpenDB Error: rc" (info) when the open fails.
+    ///@{
+    /// Queries. Return the open's code if it failed, else the preparation's
+    /// code; step failures are logged by the parser but not returned. When
+    /// the open or the preparation fails, cursor / exists are left as they
+    /// were and the failure line is "SELECT FAILED[rc]: text",
+    /// "JoinSelect FAILED[rc]: text" or "CheckExistTable FAILED[rc]: text".
+    /// Select also logs "OpenDB Error: rc" (info) when the open fails.
     int Select(DASelectRequest& request, DACursor& cursor);
     int JoinSelect(DAJoinRequest& request, DACursor& cursor);
+    ///@}
 
-    // exists: whether a table named exactly tableName exists. A null
-    // tableName throws std::logic_error (the connection is closed first).
+    /// exists: whether a table named exactly tableName exists. A null
+    /// tableName throws std::logic_error (the connection is closed first).
     int CheckExistTable(DABasePath& location, char const* tableName, bool& exists);
 };
 

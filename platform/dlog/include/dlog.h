@@ -1,4 +1,5 @@
-/*
+/**
+ * @file dlog.h
  * dlog.h - the platform log, as this library and its tests see it.
  *
  * __dlog_print() formats one line and hands it to the current sink. The
@@ -19,10 +20,10 @@
 extern "C" {
 #endif
 
-/* Log buffers. The library writes to the main buffer only. */
+/** Log buffers. The library writes to the main buffer only. */
 typedef enum { LOG_ID_MAIN = 0, LOG_ID_RADIO, LOG_ID_SYSTEM, LOG_ID_APPS, LOG_ID_MAX } log_id_t;
 
-/* Priorities. The library uses DLOG_INFO (4), DLOG_WARN (5), DLOG_ERROR (6). */
+/** Priorities. The library uses DLOG_INFO (4), DLOG_WARN (5), DLOG_ERROR (6). */
 typedef enum {
     DLOG_UNKNOWN = 0,
     DLOG_DEFAULT,
@@ -36,7 +37,7 @@ typedef enum {
     DLOG_PRIO_MAX
 } log_priority;
 
-/*
+/**
  * Formats fmt with its arguments (printf rules) and delivers the line under
  * tag and priority prio. Returns the length of the formatted text, or a
  * negative value when fmt is null or formatting fails (nothing is written).
@@ -44,21 +45,21 @@ typedef enum {
 int __dlog_print(log_id_t log_id, int prio, const char* tag, const char* fmt, ...)
     __attribute__((format(printf, 4, 5)));
 
-/*
+/**
  * Receives every formatted line: the log id, the priority, the tag (never
  * null; "" when none was given) and the text, NUL-terminated, without a
  * trailing newline. Called with no other sink call in progress.
  */
 typedef void (*dlog_sink_t)(int log_id, int prio, const char* tag, const char* text, void* user);
 
-/*
+/**
  * Replaces the sink. A null sink restores the default (standard error).
  * user is passed back to every call of sink. Safe to call at any time from
  * any thread: a line being delivered finishes with the old sink.
  */
 void dlog_set_sink(dlog_sink_t sink, void* user);
 
-/* A sink that drops every line, for programs that want the log silent. */
+/** A sink that drops every line, for programs that want the log silent. */
 void dlog_discard_sink(int log_id, int prio, const char* tag, const char* text, void* user);
 
 #ifdef __cplusplus
