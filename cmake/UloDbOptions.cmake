@@ -27,5 +27,28 @@ function(ulo_db_install_pkgconfig name description requires cflags libs)
     set(PC_CFLAGS "${cflags}")
     set(PC_LIBS "${libs}")
     configure_file("${PROJECT_SOURCE_DIR}/cmake/pkgconfig.pc.in" "${PROJECT_BINARY_DIR}/pkgconfig/${name}.pc" @ONLY)
-    install(FILES "${PROJECT_BINARY_DIR}/pkgconfig/${name}.pc" DESTINATION "${CMAKE_INSTALL_LIBDIR}/pkgconfig")
+    install(FILES "${PROJECT_BINARY_DIR}/pkgconfig/${name}.pc" DESTINATION "${CMAKE_INSTALL_LIBDIR}/pkgconfig"
+            COMPONENT dev)
+endfunction()
+
+# ulo_db_optional_part(OPTION WHAT PACKAGES FOUND): decides whether an optional
+# part is built. OPTION is AUTO (build it when FOUND), ON (build it; missing
+# packages are an error) or OFF. When the packages are missing, one sentence
+# names them: a status line for AUTO, the error for ON. Sets OPTION_ENABLED.
+function(ulo_db_optional_part option what packages found)
+    set(enabled FALSE)
+    set(sentence "${what} not built: install the Debian package(s) ${packages}, then configure again")
+    if("${${option}}" STREQUAL "AUTO")
+        if(found)
+            set(enabled TRUE)
+        else()
+            message(STATUS "${sentence}")
+        endif()
+    elseif(${option})
+        if(NOT found)
+            message(FATAL_ERROR "${sentence}")
+        endif()
+        set(enabled TRUE)
+    endif()
+    set(${option}_ENABLED ${enabled} PARENT_SCOPE)
 endfunction()

@@ -51,3 +51,6 @@ list(JOIN _ulo_arm_ld_dirs ":" _ulo_arm_ld_path)
 # Every target program (add_test, gtest_discover_tests) runs through qemu,
 # with the ARM dynamic loader and libc from the cross toolchain's folder.
 set(CMAKE_CROSSCOMPILING_EMULATOR qemu-arm -L ${ULO_DB_ARM_LIBC_ROOT} -E LD_LIBRARY_PATH=${_ulo_arm_ld_path})
+
+# Debian packages made from this build (cpack -G DEB) are for the device.
+set(CPACK_DEBIAN_PACKAGE_ARCHITECTURE armhf)

@@ -1,7 +1,9 @@
 #!/usr/bin/env bash
 # Installs the build tree into a fresh prefix, then builds and runs a program
 # against the installed package twice: once with pkg-config, once with
-# CMake's find_package. Usage: check_install.sh BUILD_DIR CXX
+# CMake's find_package. The programs run with LD_LIBRARY_PATH unset: the
+# installed libraries must find each other on their own.
+# Usage: check_install.sh BUILD_DIR CXX
 set -euo pipefail
 build_dir=$1
 cxx=$2
@@ -12,12 +14,12 @@ prefix=$work/prefix
 
 cmake --install "$build_dir" --prefix "$prefix" >/dev/null
 libdir=$(dirname "$(find "$prefix" -name 'libulo_db.so' -print -quit)")
-export LD_LIBRARY_PATH=$libdir
+unset LD_LIBRARY_PATH
 
 echo "-- pkg-config"
 export PKG_CONFIG_PATH=$libdir/pkgconfig
 # shellcheck disable=SC2046
-"$cxx" -std=c++17 "$here/consumer.cpp" -o "$work/consumer_pc" $(pkg-config --cflags --libs ulo_db)
+"$cxx" -std=c++17 "$here/consumer.cpp" -o "$work/consumer_pc" $(pkg-config --cflags --libs ulo_db) -Wl,-rpath,"$libdir"
 mkdir "$work/run_pc"
 "$work/consumer_pc" "$work/run_pc"
 
