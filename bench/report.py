@@ -66,6 +66,19 @@ def command_output(command):
         return ""
 
 
+def data_folder(text, build):
+    """A benchmark data folder as the report shows it: under the build
+    directory as BUILD_DIR/..., so no machine's own path gets into the
+    report; a folder elsewhere by its name only, /dev/shm excepted."""
+    path, bracket, rest = text.partition(" [")
+    build = os.path.realpath(build)
+    if os.path.realpath(path).startswith(build + os.sep):
+        path = "BUILD_DIR/" + os.path.relpath(os.path.realpath(path), build)
+    elif not path.startswith("/dev/shm/"):
+        path = os.path.basename(path)
+    return path + bracket + rest
+
+
 def machine(context, build):
     cpu = "unknown"
     with open("/proc/cpuinfo") as handle:
@@ -92,8 +105,8 @@ def machine(context, build):
         ("SQLite", context.get("sqlite_version", "?")),
         ("Google Benchmark", versions["libbenchmark-dev"]),
         ("SQLiteCpp", versions["libsqlitecpp-dev"]),
-        ("tmpfs folder", context.get("ulo_dir_tmpfs", "?")),
-        ("disk folder", context.get("ulo_dir_disk", "?")),
+        ("tmpfs folder", data_folder(context.get("ulo_dir_tmpfs", "?"), build)),
+        ("disk folder", data_folder(context.get("ulo_dir_disk", "?"), build)),
         ("Run", context.get("date", "?")),
     ]
 

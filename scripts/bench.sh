@@ -11,26 +11,15 @@
 # directory (ordinary disk); all of it is removed at the end.
 set -euo pipefail
 
-ROOT="$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)"
+source "$(dirname "${BASH_SOURCE[0]}")/lib.sh"
+ROOT=$ULO_ROOT
 BUILD_DIR="${BUILD_DIR:-$ROOT/build-bench}"
 REPETITIONS="${REPETITIONS:-3}"
 RESULTS="$BUILD_DIR/bench-results"
 
-# Packages the benchmarks need (Debian names).
-missing=()
-for package in libbenchmark-dev libsqlitecpp-dev gnuplot-nox libsqlite3-dev cmake g++ python3; do
-    dpkg -s "$package" >/dev/null 2>&1 || missing+=("$package")
-done
-if ((${#missing[@]})); then
-    echo "installing ${missing[*]}"
-    SUDO=""
-    [[ $(id -u) -ne 0 ]] && SUDO=sudo
-    $SUDO apt-get update
-    $SUDO DEBIAN_FRONTEND=noninteractive apt-get install -y "${missing[@]}"
-fi
-
-cmake -S "$ROOT" -B "$BUILD_DIR" -DCMAKE_BUILD_TYPE=Release -DULO_DB_BUILD_BENCHMARKS=ON >/dev/null
-cmake --build "$BUILD_DIR" --target ulo_db_bench ulo_db_memory_probe -j"$(nproc)"
+ulo_install build bench
+ulo_configure "$BUILD_DIR" -DCMAKE_BUILD_TYPE=Release -DULO_DB_BUILD_BENCHMARKS=ON >/dev/null
+cmake --build "$BUILD_DIR" --target ulo_db_bench ulo_db_memory_probe -j"$ULO_JOBS"
 
 mkdir -p "$RESULTS"
 probe_dirs=()

@@ -3,16 +3,17 @@
 #   1. clang-tidy (the repository's .clang-tidy) over the sources of the
 #      library and the platform stand-ins, any warning is an error; it reads
 #      compile_commands.json from a configure-only build in build-tidy;
-#   2. clang-format --dry-run --Werror over every tracked *.cpp and *.h.
-# Both run; the script fails if either found anything.
+#   2. clang-format --dry-run --Werror over every tracked *.cpp and *.h;
+#   3. the doc target: Doxygen over the public headers, where any warning
+#      (an undocumented public class or operation included) is an error.
+# All run; the script fails if any found anything.
 set -euo pipefail
 
-cd "$(dirname "${BASH_SOURCE[0]}")/.."
-ROOT=$PWD
+source "$(dirname "${BASH_SOURCE[0]}")/lib.sh"
+ROOT=$ULO_ROOT
 BUILD=$ROOT/build-tidy
-JOBS=$(nproc)
-
-step() { printf '\n==> %s\n' "$*"; }
+JOBS=$ULO_JOBS
+cd "$ROOT"
 
 # The first of the given tool names found on PATH.
 pick() {
@@ -24,18 +25,15 @@ pick() {
 }
 
 if ! pick clang-tidy-14 clang-tidy >/dev/null || ! pick clang-format-14 clang-format >/dev/null; then
-    step "Installing clang-tidy and clang-format"
-    "$ROOT/scripts/install-deps.sh" static
+    ulo_install static
 fi
 TIDY=$(pick clang-tidy-14 clang-tidy)
 FORMAT=$(pick clang-format-14 clang-format)
-command -v cmake >/dev/null || "$ROOT/scripts/install-deps.sh" build
+ulo_install build docs
 
-step "Configure $BUILD for compile_commands.json (library and platform only)"
-generator=()
-command -v ninja >/dev/null && generator=(-G Ninja)
-cmake -S "$ROOT" -B "$BUILD" "${generator[@]}" -DCMAKE_EXPORT_COMPILE_COMMANDS=ON \
-    -DULO_DB_BUILD_TESTS=OFF -DULO_DB_BUILD_EXAMPLES=OFF -DULO_DB_BUILD_BENCHMARKS=OFF >/dev/null
+step "Configure $BUILD for compile_commands.json (library and platform only) and the doc target"
+ulo_configure "$BUILD" -DCMAKE_EXPORT_COMPILE_COMMANDS=ON \
+    -DULO_DB_BUILD_TESTS=OFF -DULO_DB_BUILD_EXAMPLES=OFF -DULO_DB_BUILD_BENCHMARKS=OFF -DULO_DB_BUILD_DOCS=ON >/dev/null
 
 mapfile -t sources < <(sed -nE 's/^ *"file": "(.*)",?$/\1/p' "$BUILD/compile_commands.json" |
     grep -E "^$ROOT/(lib|platform)/" | sort -u)
@@ -63,6 +61,14 @@ if ((${#bad[@]})); then
     status=1
 else
     echo "clang-format: clean"
+fi
+
+step "doxygen $(doxygen --version) over the public headers (cmake --build $BUILD --target doc)"
+if cmake --build "$BUILD" --target doc; then
+    echo "doxygen: clean"
+else
+    echo "doxygen: FAILED (every warning above is an error)" >&2
+    status=1
 fi
 
 exit $status

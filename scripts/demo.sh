@@ -3,8 +3,8 @@
 # file, with the generated SQL, the results and the log lines.
 #   scripts/demo.sh [DIRECTORY]   (default /tmp/ulo_db_demo)
 set -euo pipefail
-root=$(cd "$(dirname "$0")/.." && pwd)
-"$root/scripts/install-deps.sh" build
-cmake -S "$root" -B "$root/build" -DULO_DB_BUILD_BENCHMARKS=OFF >/dev/null
-cmake --build "$root/build" --target ulo_db_demo -j"$(nproc)" >/dev/null
-exec "$root/build/examples/ulo_db_demo" "$@"
+source "$(dirname "${BASH_SOURCE[0]}")/lib.sh"
+ulo_install build
+ulo_configure "$ULO_ROOT/build" >/dev/null
+cmake --build "$ULO_ROOT/build" --target ulo_db_demo -j"$ULO_JOBS" >/dev/null
+exec "$ULO_ROOT/build/examples/ulo_db_demo" "$@"

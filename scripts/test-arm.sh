@@ -7,26 +7,20 @@
 # The target's SQLite comes from Debian's armhf packages, downloaded with
 # apt-get download and unpacked with dpkg -x into build-arm/arm-sqlite (no
 # armhf package is installed). GoogleTest is compiled for the target from
-# /usr/src/googletest. Extra arguments go to ctest.
+# /usr/src/googletest. Extra arguments go to ctest. At the end the armhf
+# Debian packages are made (cpack) and checked: architecture, contents, and
+# an outside program built against them run under qemu-arm.
 set -euo pipefail
 
-cd "$(dirname "${BASH_SOURCE[0]}")/.."
-ROOT=$PWD
+source "$(dirname "${BASH_SOURCE[0]}")/lib.sh"
+ROOT=$ULO_ROOT
 BUILD=$ROOT/build-arm
 SQLITE_ROOT=$BUILD/arm-sqlite
-JOBS=$(nproc)
-
-step() { printf '\n==> %s\n' "$*"; }
+JOBS=$ULO_JOBS
+cd "$ROOT"
 
 step "Host tools (cmake, ninja, cross compiler, qemu, googletest sources)"
-need=()
-for pkg in cmake ninja-build g++-arm-linux-gnueabihf qemu-user googletest; do
-    dpkg-query -W -f='${Status}' "$pkg" 2>/dev/null | grep -q "install ok installed" || need+=("$pkg")
-done
-if ((${#need[@]})); then
-    apt-get update || echo "apt-get update failed in part; going on with the indexes there are"
-    DEBIAN_FRONTEND=noninteractive apt-get install -y --no-install-recommends "${need[@]}"
-fi
+ulo_install arm
 
 step "armhf SQLite into $SQLITE_ROOT"
 if [[ ! -e $SQLITE_ROOT/usr/include/sqlite3.h || ! -e $SQLITE_ROOT/usr/lib/arm-linux-gnueabihf/libsqlite3.so ]]; then
@@ -44,9 +38,7 @@ if [[ ! -e $SQLITE_ROOT/usr/include/sqlite3.h || ! -e $SQLITE_ROOT/usr/lib/arm-l
 fi
 
 step "Configure $BUILD"
-generator=()
-command -v ninja >/dev/null && generator=(-G Ninja)
-cmake -S "$ROOT" -B "$BUILD" "${generator[@]}" \
+ulo_configure "$BUILD" \
     -DCMAKE_TOOLCHAIN_FILE="$ROOT/cmake/toolchains/arm-linux-gnueabihf.cmake" \
     -DULO_DB_ARM_SQLITE_ROOT="$SQLITE_ROOT" \
     -DCMAKE_BUILD_TYPE=RelWithDebInfo
@@ -63,5 +55,7 @@ arm-linux-gnueabihf-strip -o "$tmp" "$lib"
 echo "$(basename "$lib"): $(stat -c %s "$lib") bytes as built, $(stat -c %s "$tmp") bytes stripped"
 
 step "Tests under qemu-arm"
-cd "$BUILD"
-ctest --output-on-failure -j "$JOBS" "$@"
+(cd "$BUILD" && ctest --output-on-failure -j "$JOBS" "$@")
+
+step "Debian packages (armhf): architecture, contents, an outside program under qemu-arm"
+"$ROOT/tests/install/check_debs.sh" "$BUILD" arm "$SQLITE_ROOT"

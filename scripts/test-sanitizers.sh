@@ -9,9 +9,10 @@
 # Further arguments after the mode go to ctest (e.g. -R Concurrent).
 set -euo pipefail
 
-cd "$(dirname "${BASH_SOURCE[0]}")/.."
-ROOT=$PWD
-JOBS=$(nproc)
+source "$(dirname "${BASH_SOURCE[0]}")/lib.sh"
+ROOT=$ULO_ROOT
+JOBS=$ULO_JOBS
+cd "$ROOT"
 
 mode=${1:-all}
 [[ $# -gt 0 ]] && shift
@@ -24,13 +25,8 @@ all) modes=(address thread) ;;
     ;;
 esac
 
-step() { printf '\n==> %s\n' "$*"; }
-
 step "Host build tools (missing ones only)"
-"$ROOT/scripts/install-deps.sh" build
-
-generator=()
-command -v ninja >/dev/null && generator=(-G Ninja)
+ulo_install build tests
 
 # TSan maps its shadow memory at fixed addresses; with a high ASLR entropy
 # (vm.mmap_rnd_bits > 28, common on newer kernels) the program's own
@@ -51,8 +47,8 @@ run() {
     esac
 
     step "[$sanitizer] configure $build"
-    cmake -S "$ROOT" -B "$build" "${generator[@]}" -DULO_DB_SANITIZER="$sanitizer" -DCMAKE_BUILD_TYPE=RelWithDebInfo \
-        -DULO_DB_BUILD_BENCHMARKS=OFF
+    ulo_configure "$build" -DULO_DB_SANITIZER="$sanitizer" -DCMAKE_BUILD_TYPE=RelWithDebInfo \
+        -DULO_DB_BUILD_TESTS=ON -DULO_DB_BUILD_BENCHMARKS=OFF -DULO_DB_BUILD_DOCS=OFF
 
     step "[$sanitizer] build"
     cmake --build "$build" -j "$JOBS"

@@ -8,15 +8,24 @@
 # With no argument all of them run; name some to run only those
 # (scripts/test.sh host is the quick loop). Stops at the first failure.
 set -euo pipefail
-root=$(cd "$(dirname "$0")/.." && pwd)
+source "$(dirname "${BASH_SOURCE[0]}")/lib.sh"
+root=$ULO_ROOT
 suites=("$@")
 [[ ${#suites[@]} -gt 0 ]] || suites=(host arm asan tsan static)
 
+# The host suite ends with the Debian packages: installed into /usr, used by
+# an outside program and removed again, which needs root.
 run_host() {
-    "$root/scripts/install-deps.sh" build
-    cmake -S "$root" -B "$root/build" >/dev/null
-    cmake --build "$root/build" -j"$(nproc)"
-    (cd "$root/build" && ctest --output-on-failure -j"$(nproc)")
+    ulo_install build tests package
+    ulo_configure "$root/build" -DULO_DB_BUILD_TESTS=ON >/dev/null
+    cmake --build "$root/build" -j"$ULO_JOBS"
+    (cd "$root/build" && ctest --output-on-failure -j"$ULO_JOBS")
+    step "Debian packages (amd64): dpkg -i, an outside program against /usr, dpkg -r"
+    if [[ $(id -u) -eq 0 ]]; then
+        "$root/tests/install/check_debs.sh" "$root/build" host
+    else
+        echo "skipped: installing packages needs root"
+    fi
 }
 
 run_suite() {
