@@ -23,7 +23,7 @@ if [[ $mode == host ]]; then
 else
     root=$work/usr
     for deb in "${debs[@]}"; do
-        dpkg-deb -I "$deb" | grep -qx ' Architecture: armhf' && dpkg-deb -c "$deb" && dpkg-deb -x "$deb" "$work"
+        dpkg-deb -I "$deb" | grep -x ' Architecture: armhf' >/dev/null && dpkg-deb -c "$deb" && dpkg-deb -x "$deb" "$work"
     done | grep -cE '/(lib(ulo_db|ulo_util|dlog)\.so(\.1|\.1\.0\.0)?( ->.*)?|ulo_db\.pc|ulo_dbConfig\.cmake|DADatabase\.h)$' | grep -qx 12
     cmake_args=(-DCMAKE_TOOLCHAIN_FILE="$here/../../cmake/toolchains/arm-linux-gnueabihf.cmake" -DULO_DB_ARM_SQLITE_ROOT="$3")
     run=(qemu-arm -L /usr/arm-linux-gnueabihf -E LD_LIBRARY_PATH="$3/usr/lib/arm-linux-gnueabihf")
