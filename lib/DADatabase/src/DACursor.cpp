@@ -8,7 +8,7 @@
 
 namespace {
 
-// The conversion step of GetInt and GetDouble, given the current value (null
+// The conversion step of GetInt, GetInt64 and GetDouble, given the current value (null
 // when the lookup already failed and logged): formatted extraction from a
 // fresh default stream, so leading blanks are skipped, trailing text is
 // ignored and end of input alone is no failure. Logs a failure under func.
@@ -173,4 +173,9 @@ int DACursor::GetInt(const char* column, int& value)
 int DACursor::GetDouble(const char* column, double& value)
 {
     return ReadNumber(CurrentValue(column, __func__), value, __func__, "CONVERT TO DOUBLE ERROR!!!");
+}
+
+int DACursor::GetInt64(const char* column, std::int64_t& value)
+{
+    return ReadNumber(CurrentValue(column, __func__), value, __func__, "CONVERT TO INT ERROR!!!");
 }

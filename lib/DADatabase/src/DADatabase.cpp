@@ -55,7 +55,8 @@ int Execute(DADatabase& database, Request& request, void (DASqlGenerator::*gener
     return rc;
 }
 
-// The frame the queries share: open, generate, prepare under busy-retry,
+// The frame the queries share (called as ::Query, since the member
+// DADatabase::Query hides the name inside the class): open, generate, prepare under busy-retry,
 // and parse the statement on success; on failure log "<word> FAILED[rc]:
 // text" under func. Returns the open's code if it failed, else the
 // preparation's.
@@ -146,7 +147,7 @@ int DADatabase::CreateTable(DACreateRequest& request)
 
 int DADatabase::Select(DASelectRequest& request, DACursor& cursor)
 {
-    return Query(
+    return ::Query(
         *this, request, [&](std::string& sql) { DASqlGenerator().GetSelectSql(request, sql); },
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
         __func__, "SELECT", true);
@@ -154,15 +155,23 @@ int DADatabase::Select(DASelectRequest& request, DACursor& cursor)
 
 int DADatabase::JoinSelect(DAJoinRequest& request, DACursor& cursor)
 {
-    return Query(
+    return ::Query(
         *this, request, [&](std::string& sql) { DASqlGenerator().GetJoinSql(request, sql); },
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
         __func__, "JoinSelect", false);
 }
 
+int DADatabase::Query(DAQueryRequest& request, DACursor& cursor)
+{
+    return ::Query(
+        *this, request, [&](std::string& sql) { DASqlGenerator().GetQuerySql(request, sql); },
+        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
+        __func__, "QUERY", true);
+}
+
 int DADatabase::CheckExistTable(DABasePath& location, char const* tableName, bool& exists)
 {
-    return Query(
+    return ::Query(
         *this, location,
         [&](std::string& sql) {
             // Thrown explicitly (a std::string from null is undefined); the
