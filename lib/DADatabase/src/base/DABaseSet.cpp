@@ -31,7 +31,7 @@ std::string ValueText(std::int64_t value)
 {
     char text[24];  // "-9223372036854775808" is 20 characters
     const std::to_chars_result end = std::to_chars(text, text + sizeof text, value);
-    return std::string(text, end.ptr);
+    return {text, end.ptr};
 }
 
 // The one insertion all the setters make: refuse a null column, then build
