@@ -31,7 +31,7 @@ public:
 
     /// At most count rows after skipping offset rows; replaces an earlier
     /// page. A negative count means no limit (the rows after offset); a
-    /// negative offset counts as 0.
+    /// negative offset counts as 0. Takes no lock, like SetTable.
     void SetLimit(int count, int offset = 0);
 
     /// Replaces keys by the sort keys in call order; leaves it untouched
