@@ -55,8 +55,7 @@ int Execute(DADatabase& database, Request& request, void (DASqlGenerator::*gener
     return rc;
 }
 
-// The frame the queries share (called as ::Query, since the member
-// DADatabase::Query hides the name inside the class): open, generate, prepare under busy-retry,
+// The frame the queries share: open, generate, prepare under busy-retry,
 // and parse the statement on success; on failure log "<word> FAILED[rc]:
 // text" under func. Returns the open's code if it failed, else the
 // preparation's.
@@ -145,6 +144,8 @@ int DADatabase::CreateTable(DACreateRequest& request)
     return Execute(*this, request, &DASqlGenerator::GetCreateTableSql, __func__, "createTable");
 }
 
+// The frame is called as ::Query: inside the class the name Query means
+// the member DADatabase::Query.
 int DADatabase::Select(DASelectRequest& request, DACursor& cursor)
 {
     return ::Query(
