@@ -10,8 +10,9 @@ namespace {
 
 // The conversion step of GetInt, GetInt64 and GetDouble, given the current
 // value (null when the lookup already failed and logged): formatted
-// extraction from a fresh default stream, so leading blanks are skipped, trailing text is
-// ignored and end of input alone is no failure. Logs a failure under func.
+// extraction from a fresh default stream, so leading blanks are skipped,
+// trailing text is ignored and end of input alone is no failure. Logs a
+// failure under func.
 template <typename Number>
 int ReadNumber(const std::string* text, Number& out, const char* func, const char* failure)
 {
