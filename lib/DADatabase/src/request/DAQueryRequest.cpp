@@ -1,9 +1,9 @@
 #include "DAQueryRequest.h"
 
+#include <utility>
+
 #include "DALog.h"
 #include "DAMemberLock.h"
-
-#include <utility>
 
 void DAQueryRequest::SetOrderBy(char const* column, bool descending)
 {
