@@ -9,6 +9,20 @@
 
 namespace bench {
 
+// A folder the benchmark program runs its cases in.
+struct Location {
+    std::string name;  // "tmpfs" or "disk"
+    std::string dir;  // mkdtemp folder, removed at the end
+    std::string Path(const char* file) const { return dir + "/" + file; }
+};
+
+// The read-only database of the query cases, in every location.
+constexpr const char* kQueryFile = "query.db";
+
+// Registers the paged-query cases (bench_query.cpp) for every location, and
+// the column-name interning case once.
+void RegisterPageQueries(const std::vector<Location>& locations);
+
 // Row counts of the select tables ("sel_<N>").
 extern const std::vector<int> kSelectSizes;
 // Rows of the join's left table (every one has a partner on the right).

@@ -37,13 +37,9 @@
 
 namespace {
 
-struct Location {
-    std::string name;  // "tmpfs" or "disk"
-    std::string dir;  // mkdtemp folder, removed at the end
-    std::string Path(const char* file) const { return dir + "/" + file; }
-};
+using bench::kQueryFile;
+using bench::Location;
 
-constexpr const char* kQueryFile = "query.db";
 constexpr const char* kWriteFile = "write.db";
 constexpr int kWriteRows = 100;  // rows of the write table w
 constexpr int kDeletePool = 1000;  // rows of the delete table d, refilled when used up
@@ -627,6 +623,7 @@ int main(int argc, char** argv)
         for (const Location& location : g_locations) {
             RegisterQueries(location, sizes);
         }
+        bench::RegisterPageQueries(g_locations);
         RegisterWalk(g_locations.front());
         RegisterLocks();
         benchmark::RunSpecifiedBenchmarks();

@@ -25,6 +25,9 @@ WALK_TARGET = 1.5
 LOCK_TARGET_NS = 100.0
 LOCK_MEMORY_BOUND_KIB = 1024
 CURSOR_MEMORY_TARGET = 1.1
+PAGE_SPEEDUP_TARGET = 100.0
+PAGE_RAW_TARGET = 1.8
+INTERN_TARGET_NS = 100.0
 
 UNIT_TO_US = {"ns": 1e-3, "us": 1.0, "ms": 1e3, "s": 1e6}
 
@@ -35,6 +38,7 @@ def load_bench(path):
         data = json.load(handle)
     samples = defaultdict(list)
     items = defaultdict(list)
+    held = defaultdict(list)
     for run in data["benchmarks"]:
         if run.get("run_type") != "iteration" or run.get("error_occurred"):
             continue
@@ -43,10 +47,13 @@ def load_bench(path):
         samples[key].append(run["real_time"] * UNIT_TO_US[run["time_unit"]])
         if "items_per_second" in run:
             items[key].append(run["items_per_second"])
+        if "result_bytes" in run:
+            held[key].append(run["result_bytes"])
     times = {key: statistics.median(values) for key, values in samples.items()}
     rates = {key: statistics.median(values) for key, values in items.items()}
     spread = {key: (min(values), max(values), len(values)) for key, values in samples.items()}
-    return data.get("context", {}), times, rates, spread
+    result_bytes = {key: statistics.median(values) for key, values in held.items()}
+    return data.get("context", {}), times, rates, spread, result_bytes
 
 
 def load_memory(path):
@@ -123,7 +130,53 @@ def verdict(ok):
     return "yes" if ok else "**no**"
 
 
-def build_tables(times, rates, spread, memory):
+def page_tables(times, result_bytes, locations):
+    """The paged-query and column-name sections, and their summary rows."""
+    lines, summary = [], []
+    rows = []
+    for loc in locations:
+        key = ("page", "100000", loc)
+        lib, raw, whole = (times.get(key + (impl,)) for impl in ("lib", "raw", "selectall"))
+        if None not in (lib, raw, whole):
+            rows.append((loc, lib, raw, whole, result_bytes.get(key + ("lib",)), result_bytes.get(key + ("selectall",))))
+    if rows:
+        lines += ["### Paged queries", "",
+                  "Rows 1,001–1,100 of the 100,000-row table by its indexed key (`ORDER BY id LIMIT 100 OFFSET "
+                  "1000`): `Query` into a `DACursor`; raw: the same statement text through `sqlite3_prepare_v2` + "
+                  "`sqlite3_step` copying every value as text; and `Select` of the whole table, what a caller had "
+                  "to do before `Query`. Each opens, reads, closes and frees its result. *Held* is the heap the "
+                  "result occupies while alive (`mallinfo2`).", "",
+                  "| location | `Query` page | raw page | `Select` all | all / page | page / raw | held: page / all |",
+                  "|---|---|---|---|---|---|---|"]
+        kib = lambda b: f"{b / 1024:.1f} KiB" if b is not None and b < 1 << 20 else (
+            f"{b / (1 << 20):.1f} MiB" if b is not None else "—")
+        for loc, lib, raw, whole, page_held, all_held in rows:
+            lines.append(f"| {loc} | {fmt_time(lib)} | {fmt_time(raw)} | {fmt_time(whole)} | {whole / lib:.0f} × | "
+                         f"{lib / raw:.3f} | {kib(page_held)} / {kib(all_held)} |")
+            summary.append((f"`Query` page of 100k, {loc}", fmt_time(lib), f"`Select` all {fmt_time(whole)}",
+                            f"{whole / lib:.0f} ×", f"≥ {PAGE_SPEEDUP_TARGET:.0f} × faster",
+                            whole / lib >= PAGE_SPEEDUP_TARGET))
+            summary.append((f"`Query` page vs raw, {loc}", fmt_time(lib), f"raw {fmt_time(raw)}", f"{lib / raw:.3f}",
+                            f"≤ {PAGE_RAW_TARGET} × raw", lib / raw <= PAGE_RAW_TARGET))
+        lines.append("")
+    interned = [(threads, times.get(("intern", "existing", "memory", threads))) for threads in ("1", "2")]
+    if interned[0][1] is not None:
+        lines += ["### Column names", "",
+                  "`DAColumnName::Intern` of a name interned before (a shared lock and a hash lookup), from one "
+                  "thread and from two at once (wall time per call of each thread, 2 cores).", "",
+                  "| threads | per call | target |", "|---|---|---|"]
+        for threads, us in interned:
+            if us is not None:
+                target = f"< {INTERN_TARGET_NS:.0f} ns" if threads == "1" else "—"
+                lines.append(f"| {threads} | {us * 1000:.1f} ns | {target} |")
+        lines.append("")
+        ns = interned[0][1] * 1000
+        summary.append(("`Intern` of a known name", f"{ns:.1f} ns", "—", "—", f"< {INTERN_TARGET_NS:.0f} ns",
+                        ns < INTERN_TARGET_NS))
+    return lines, summary
+
+
+def build_tables(times, rates, spread, memory, result_bytes=None):
     lines = []
     summary = []
     locations = [loc for loc in ("tmpfs", "disk") if any(k[2] == loc for k in times)]
@@ -273,6 +326,10 @@ def build_tables(times, rates, spread, memory):
                         f"bounded (≤ {LOCK_MEMORY_BOUND_KIB} KiB, no trend)",
                         growth <= LOCK_MEMORY_BOUND_KIB and samples[-1][1] - samples[0][1] <= 64))
 
+    page_lines, page_summary = page_tables(times, result_bytes or {}, locations)
+    lines += page_lines
+    summary += page_summary
+
     head = ["### Summary against the targets", "",
             "| case | library | baseline(s) | ratio | target | met? |", "|---|---|---|---|---|---|"]
     for case, lib, base, ratio, target, ok in summary:
@@ -326,9 +383,9 @@ def main():
     parser.add_argument("--img", required=True)
     args = parser.parse_args()
 
-    context, times, rates, spread = load_bench(args.bench)
+    context, times, rates, spread, result_bytes = load_bench(args.bench)
     memory = load_memory(args.memory)
-    tables, per_row = build_tables(times, rates, spread, memory)
+    tables, per_row = build_tables(times, rates, spread, memory, result_bytes)
     plot(per_row, args.img)
 
     generated = ["## Results", "", "Generated by `scripts/bench.sh` from the run below; do not edit by hand.", "",

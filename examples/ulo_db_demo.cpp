@@ -1,5 +1,6 @@
 // A tour of libulo_db on a real database file: create two related tables,
-// write, query, join, check and drop, printing each step's result code, the
+// write, query, join, list a table sorted and a page at a time, store a
+// 64-bit time stamp, name columns at run time, check and drop, printing each step's result code, the
 // statement the library generated, every result as a table, and the
 // library's own log lines as they are written.
 //
@@ -12,11 +13,13 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <string>
 #include <vector>
 
+#include "DAColumnName.h"
 #include "DADatabase.h"
 #include "DASqlGenerator.h"
 #include "dlog.h"
@@ -224,6 +227,107 @@ void Query(DADatabase& db, DASqlGenerator& generator, const char* dir)
     Result(db.Select(missing, cursor), SQLITE_ERROR);
 }
 
+// A list screen's way of reading: sorted by name, two rows at a time, until
+// a page comes back empty.
+void ListByPages(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    const int pageSize = 2;
+    for (int page = 0;; ++page) {
+        DAQueryRequest query;
+        SetLocation(query, dir, "contacts");
+        query.SetOrderBy(kName);
+        query.SetLimit(pageSize, page * pageSize);
+        std::string sql;
+        generator.GetQuerySql(query, sql);
+        DACursor cursor;
+        Step(("Contacts by name, page " + std::to_string(page + 1)).c_str(), sql);
+        Result(db.Query(query, cursor), SQLITE_OK);
+        PrintCursor(cursor);
+        if (cursor.GetCount() < pageSize) {
+            break;
+        }
+    }
+}
+
+// Milliseconds since 1970 pass int: SetData(std::int64_t) stores them and
+// GetInt64 reads them back.
+void TimeStamps(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    DACreateRequest events;
+    SetLocation(events, dir, "events");
+    events.SetPrimaryKey(kId, "INTEGER");
+    events.SetColumnKey("at_ms", "INTEGER");
+    Write(db, "Create the table events", events, &DASqlGenerator::GetCreateTableSql, &DADatabase::CreateTable);
+
+    const std::int64_t stamp = 1700000000123;  // 2023-11-14 22:13:20.123 UTC
+    DAUpsertRequest upsert;
+    SetLocation(upsert, dir, "events");
+    upsert.SetData(kId, 1);
+    upsert.SetData("at_ms", stamp);
+    Write(db, "Store a millisecond time stamp", upsert, &DASqlGenerator::GetUpsertSql, &DADatabase::Upsert);
+
+    DASelectRequest select;
+    SetLocation(select, dir, "events");
+    std::string sql;
+    generator.GetSelectSql(select, sql);
+    DACursor cursor;
+    Step("Read it back with GetInt64", sql);
+    Result(db.Select(select, cursor), SQLITE_OK);
+    std::int64_t read = 0;
+    if (cursor.MoveToNext() == 0 && cursor.GetInt64("at_ms", read) == 0) {
+        std::printf("   at_ms = %lld (%s)\n", static_cast<long long>(read), read == stamp ? "as stored" : "changed");
+    }
+}
+
+// Column names made at run time (here from a counter; in an application
+// from a configuration) must outlive the request: DAColumnName gives one
+// lasting pointer per name, so a name rebuilt later is the same key.
+void RunTimeNames(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    const int slots = 3;
+    DACreateRequest create;
+    SetLocation(create, dir, "slots");
+    create.SetPrimaryKey(kId, "INTEGER");
+    for (int i = 1; i <= slots; ++i) {
+        create.SetColumnKey(DAColumnName::Intern(("slot_" + std::to_string(i)).c_str()), "INTEGER");
+    }
+    Write(db, "Create a table whose columns are named at run time", create, &DASqlGenerator::GetCreateTableSql,
+          &DADatabase::CreateTable);
+
+    DAUpsertRequest upsert;
+    SetLocation(upsert, dir, "slots");
+    upsert.SetData(kId, 1);
+    for (int round = 0; round < 2; ++round) {  // the second round finds the same keys: nothing changes
+        for (int i = 1; i <= slots; ++i) {
+            upsert.SetData(DAColumnName::Intern(("slot_" + std::to_string(i)).c_str()), i * 10 + round);
+        }
+    }
+    // The statement lists columns in the order of the names' addresses,
+    // which differs from run to run; the data map is shown sorted instead.
+    DAValueMap data;
+    upsert.GetDataMap(data);
+    std::vector<std::string> entries;
+    for (const auto& entry : data) {
+        entries.push_back(std::string(entry.first) + "=" + entry.second);
+    }
+    std::sort(entries.begin(), entries.end());
+    std::printf("\n== Fill it from names built again in every round\n   data:");
+    for (const std::string& entry : entries) {
+        std::printf(" %s", entry.c_str());
+    }
+    std::printf(" (%zu columns, each once)\n", entries.size());
+    Result(db.Upsert(upsert), SQLITE_OK);
+
+    DASelectRequest select;
+    SetLocation(select, dir, "slots");
+    DACursor cursor;
+    std::string sql;
+    generator.GetSelectSql(select, sql);
+    Step("Read the row back", sql);
+    Result(db.Select(select, cursor), SQLITE_OK);
+    PrintCursor(cursor);
+}
+
 void CheckAndDrop(DADatabase& db, DASqlGenerator& generator, const char* dir)
 {
     std::string sql;
@@ -265,6 +369,9 @@ int main(int argc, char** argv)
     CreateTables(db, dir);
     WriteRows(db, dir);
     Query(db, generator, dir);
+    ListByPages(db, generator, dir);
+    TimeStamps(db, generator, dir);
+    RunTimeNames(db, generator, dir);
     CheckAndDrop(db, generator, dir);
 
     std::printf("\n%s\n", g_unexpected == 0 ? "Every step gave the expected result." : "Some steps failed.");

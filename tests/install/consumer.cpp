@@ -7,6 +7,7 @@
 
 #include <DABasePath.h>
 #include <DABaseSet.h>
+#include <DAColumnName.h>
 #include <DACreateRequest.h>
 #include <DACursor.h>
 #include <DADatabase.h>

@@ -1,6 +1,7 @@
 #ifndef DABASESET_H
 #define DABASESET_H
 
+#include <cstdint>
 #include <map>
 #include <string>
 
@@ -37,6 +38,12 @@ public:
     void SetData(char const* column, int value);
     void SetData(char const* column, double value);
     ///@}
+    /// Stores the plain decimal text of a 64-bit value under column in the
+    /// data map ("-9223372036854775808", "1700000000000"): no digit
+    /// grouping, whatever the global locale. Same lock, null-column line
+    /// and first-value-wins rule as the other setters. Chosen for
+    /// std::int64_t arguments; int and double keep their own overloads.
+    void SetData(char const* column, std::int64_t value);
 
     ///@{
     /// The same for the where map.
@@ -44,6 +51,8 @@ public:
     void SetWhere(char const* column, int value);
     void SetWhere(char const* column, double value);
     ///@}
+    /// The 64-bit setter for the where map.
+    void SetWhere(char const* column, std::int64_t value);
 
     ///@{
     /// Replace out by a copy of the data map / where map.

@@ -1,6 +1,7 @@
 #ifndef DACURSOR_H
 #define DACURSOR_H
 
+#include <cstdint>
 #include <map>
 #include <string>
 #include <vector>
@@ -83,6 +84,11 @@ public:
     int GetInt(const char* column, int& value);
     int GetDouble(const char* column, double& value);
     ///@}
+    /// GetInt over the 64-bit range: the same checks, codes and lines in the
+    /// same order (a value outside the range fails with "CONVERT TO INT
+    /// ERROR!!!"), value untouched on failure. Reads back what
+    /// DABaseSet::SetData(column, std::int64_t) stored.
+    int GetInt64(const char* column, std::int64_t& value);
 
 private:
     /// The value of column in the current row, or null after logging the

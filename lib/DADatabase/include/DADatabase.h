@@ -11,6 +11,7 @@
 #include "DADeleteRequest.h"
 #include "DADropRequest.h"
 #include "DAJoinRequest.h"
+#include "DAQueryRequest.h"
 #include "DASelectRequest.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
@@ -66,6 +67,13 @@ public:
     int Select(DASelectRequest& request, DACursor& cursor);
     int JoinSelect(DAJoinRequest& request, DACursor& cursor);
     ///@}
+
+    /// Select's frame for a sorted, paged query (DASqlGenerator::GetQuerySql):
+    /// the same codes, cursor handling and lines, under the function name
+    /// "Query": "OpenDB Error: rc" (info) when the open fails, "QUERY
+    /// FAILED[rc]: text" when the preparation fails. A page past the last
+    /// row returns 0 with an emptied cursor (GetCount() -1).
+    int Query(DAQueryRequest& request, DACursor& cursor);
 
     /// exists: whether a table named exactly tableName exists. A null
     /// tableName throws std::logic_error (the connection is closed first).

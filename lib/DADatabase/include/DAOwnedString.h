@@ -15,6 +15,12 @@ public:
     DAOwnedString(const DAOwnedString&) = delete;
     DAOwnedString& operator=(const DAOwnedString&) = delete;
 
+    /// Takes other's text; other then holds nothing. Never throws, so
+    /// owned strings can live in a std::vector.
+    DAOwnedString(DAOwnedString&& other) noexcept;
+    /// Releases the held text and takes other's; other then holds nothing.
+    DAOwnedString& operator=(DAOwnedString&& other) noexcept;
+
     /// Replaces the held text by a fresh copy of text and releases the old
     /// copy. A null text changes nothing. On std::bad_alloc the old text is
     /// kept.

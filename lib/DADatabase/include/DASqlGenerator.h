@@ -7,6 +7,7 @@
 #include "DADeleteRequest.h"
 #include "DADropRequest.h"
 #include "DAJoinRequest.h"
+#include "DAQueryRequest.h"
 #include "DASelectRequest.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
@@ -43,6 +44,12 @@ public:
 
     /// "SELECT * FROM t[ WHERE a='1' AND b='2']"
     void GetSelectSql(DASelectRequest& request, std::string& sql);
+
+    /// GetSelectSql's text for the same table and conditions, then
+    /// " ORDER BY a, b DESC" when sort keys are set, then " LIMIT n OFFSET m"
+    /// when a page is set (" LIMIT n" when the offset is 0; n is -1 when only
+    /// an offset is given, and nothing is added for no limit and no offset).
+    void GetQuerySql(DAQueryRequest& request, std::string& sql);
 
     /// "SELECT  * FROM l INNER JOIN r ON l.lc = r.rc[ WHERE ...]"
     void GetJoinSql(DAJoinRequest& request, std::string& sql);

@@ -8,10 +8,11 @@
 
 namespace {
 
-// The conversion step of GetInt and GetDouble, given the current value (null
-// when the lookup already failed and logged): formatted extraction from a
-// fresh default stream, so leading blanks are skipped, trailing text is
-// ignored and end of input alone is no failure. Logs a failure under func.
+// The conversion step of GetInt, GetInt64 and GetDouble, given the current
+// value (null when the lookup already failed and logged): formatted
+// extraction from a fresh default stream, so leading blanks are skipped,
+// trailing text is ignored and end of input alone is no failure. Logs a
+// failure under func.
 template <typename Number>
 int ReadNumber(const std::string* text, Number& out, const char* func, const char* failure)
 {
@@ -173,4 +174,9 @@ int DACursor::GetInt(const char* column, int& value)
 int DACursor::GetDouble(const char* column, double& value)
 {
     return ReadNumber(CurrentValue(column, __func__), value, __func__, "CONVERT TO DOUBLE ERROR!!!");
+}
+
+int DACursor::GetInt64(const char* column, std::int64_t& value)
+{
+    return ReadNumber(CurrentValue(column, __func__), value, __func__, "CONVERT TO INT ERROR!!!");
 }

@@ -144,9 +144,11 @@ int DADatabase::CreateTable(DACreateRequest& request)
     return Execute(*this, request, &DASqlGenerator::GetCreateTableSql, __func__, "createTable");
 }
 
+// The frame is called as ::Query: inside the class the name Query means
+// the member DADatabase::Query.
 int DADatabase::Select(DASelectRequest& request, DACursor& cursor)
 {
-    return Query(
+    return ::Query(
         *this, request, [&](std::string& sql) { DASqlGenerator().GetSelectSql(request, sql); },
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
         __func__, "SELECT", true);
@@ -154,15 +156,23 @@ int DADatabase::Select(DASelectRequest& request, DACursor& cursor)
 
 int DADatabase::JoinSelect(DAJoinRequest& request, DACursor& cursor)
 {
-    return Query(
+    return ::Query(
         *this, request, [&](std::string& sql) { DASqlGenerator().GetJoinSql(request, sql); },
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
         __func__, "JoinSelect", false);
 }
 
+int DADatabase::Query(DAQueryRequest& request, DACursor& cursor)
+{
+    return ::Query(
+        *this, request, [&](std::string& sql) { DASqlGenerator().GetQuerySql(request, sql); },
+        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
+        __func__, "QUERY", true);
+}
+
 int DADatabase::CheckExistTable(DABasePath& location, char const* tableName, bool& exists)
 {
-    return Query(
+    return ::Query(
         *this, location,
         [&](std::string& sql) {
             // Thrown explicitly (a std::string from null is undefined); the

@@ -125,6 +125,33 @@ void DASqlGenerator::GetSelectSql(DASelectRequest& request, std::string& sql)
     sql = std::move(text);
 }
 
+void DASqlGenerator::GetQuerySql(DAQueryRequest& request, std::string& sql)
+{
+    DAOrderKeys keys;
+    int count = -1;
+    int offset = 0;
+    request.GetOrderBy(keys);
+    request.GetLimit(count, offset);
+
+    std::string text;
+    GetSelectSql(request, text);
+    if (!keys.empty()) {
+        text += " ORDER BY ";
+        for (const auto& key : keys) {
+            text += key.first;
+            text += key.second ? " DESC, " : ", ";
+        }
+        CutAtLast(text, ", ");
+    }
+    if (count >= 0 || offset > 0) {
+        text += " LIMIT " + std::to_string(count);
+        if (offset > 0) {
+            text += " OFFSET " + std::to_string(offset);
+        }
+    }
+    sql = std::move(text);
+}
+
 void DASqlGenerator::GetJoinSql(DAJoinRequest& request, std::string& sql)
 {
     std::string leftTable;

@@ -1,5 +1,6 @@
 #include "DABaseSet.h"
 
+#include <charconv>
 #include <sstream>
 #include <stdexcept>
 
@@ -24,7 +25,16 @@ std::string ValueText(Number value)
     return stream.str();
 }
 
-// The one insertion all six setters make: refuse a null column, then build
+// 64-bit values are written without the stream: to_chars ignores the
+// locale, so a time stamp never picks up digit grouping.
+std::string ValueText(std::int64_t value)
+{
+    char text[24];  // "-9223372036854775808" is 20 characters
+    const std::to_chars_result end = std::to_chars(text, text + sizeof text, value);
+    return {text, end.ptr};
+}
+
+// The one insertion all the setters make: refuse a null column, then build
 // the text and insert it if the key is new, all under the map's lock.
 template <typename Value>
 void Store(DAValueMap& map, char const* column, Value value, const char* func)
@@ -61,6 +71,11 @@ void DABaseSet::SetData(char const* column, double value)
     Store(m_dataMap, column, value, __func__);
 }
 
+void DABaseSet::SetData(char const* column, std::int64_t value)
+{
+    Store(m_dataMap, column, value, __func__);
+}
+
 void DABaseSet::SetWhere(char const* column, char const* value)
 {
     Store(m_whereMap, column, value, __func__);
@@ -72,6 +87,11 @@ void DABaseSet::SetWhere(char const* column, int value)
 }
 
 void DABaseSet::SetWhere(char const* column, double value)
+{
+    Store(m_whereMap, column, value, __func__);
+}
+
+void DABaseSet::SetWhere(char const* column, std::int64_t value)
 {
     Store(m_whereMap, column, value, __func__);
 }

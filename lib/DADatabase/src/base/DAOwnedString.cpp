@@ -1,10 +1,24 @@
 #include "DAOwnedString.h"
 
 #include <cstring>
+#include <utility>
 
 DAOwnedString::~DAOwnedString()
 {
     delete[] m_text;
+}
+
+DAOwnedString::DAOwnedString(DAOwnedString&& other) noexcept : m_text(std::exchange(other.m_text, nullptr))
+{
+}
+
+DAOwnedString& DAOwnedString::operator=(DAOwnedString&& other) noexcept
+{
+    if (this != &other) {
+        delete[] m_text;
+        m_text = std::exchange(other.m_text, nullptr);
+    }
+    return *this;
 }
 
 void DAOwnedString::Assign(char const* text)

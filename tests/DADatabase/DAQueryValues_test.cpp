@@ -1,0 +1,192 @@
+// Sorted and paged queries, 64-bit values and run-time column names.
+
+#include <algorithm>
+#include <cstdint>
+#include <locale>
+#include <thread>
+#include <tuple>
+#include <type_traits>
+
+#include "DAColumnName.h"
+#include "DADatabase.h"
+#include "DASqlGenerator.h"
+#include "DatabaseTestUtil.h"
+#include "TempDirTest.h"
+
+namespace {
+
+// Sort keys (a leading '-' sorts descending), SetLimit's arguments (only
+// the count when the offset is 0; no call for -100) and the text after the
+// select's.
+const std::tuple<std::vector<const char*>, int, int, const char*> kTexts[] = {
+    {{}, -100, 0, ""},
+    {{"-phone", "name", "-_ID"}, -100, 0, " ORDER BY phone DESC, name, _ID DESC"},
+    {{}, 10, 0, " LIMIT 10"},
+    {{}, 0, 20, " LIMIT 0 OFFSET 20"},
+    {{}, 10, -3, " LIMIT 10"},  // a negative offset counts as 0
+    {{}, -5, 20, " LIMIT -1 OFFSET 20"},  // no limit, skip 20
+    {{}, -5, 0, ""},
+    {{"-name", "phone"}, 100, 1000, " ORDER BY name DESC, phone LIMIT 100 OFFSET 1000"},
+};
+
+// Sort keys are copied from temporaries; a null key is refused with a line.
+TEST(DAQueryRequest, TextIsTheSelectFollowedByOrderAndPage)
+{
+    LogCapture log;
+    for (const auto& [keys, count, offset, suffix] : kTexts) {
+        DAQueryRequest request;
+        request.SetOrderBy(nullptr);  // refused
+        request.SetTable("t");
+        request.SetWhere("ms", std::int64_t{1700000000000});
+        for (const char* key : keys) {
+            request.SetOrderBy(std::string(key).substr(key[0] == '-').c_str(), key[0] == '-');  // a copy is kept
+        }
+        if (count != -100) {
+            offset == 0 ? request.SetLimit(count) : request.SetLimit(count, offset);
+        }
+        std::string sql = "stale";
+        DASqlGenerator().GetQuerySql(request, sql);
+        EXPECT_EQ(std::string("SELECT * FROM t WHERE ms='1700000000000'") + suffix, sql);
+    }
+    EXPECT_EQ(Strings(std::size(kTexts), "6 DAQueryRequest.cpp:SetOrderBy > NULL COLUMN NAME, SORT KEY NOT STORED"),
+              Described(log));
+}
+
+class DAQueryFile : public TempDirTest {};
+
+int Query(const std::string& dir, const char* table, bool descending, int offset, DACursor& cursor, int count = 2)
+{
+    DAQueryRequest request;
+    request.SetPath(dir.c_str(), "q.db");
+    request.SetTable(table);
+    request.SetOrderBy("n", descending);
+    request.SetLimit(count, offset);
+    return DADatabase().Query(request, cursor);
+}
+
+// Five rows stored out of order, read two at a time in both directions.
+TEST_F(DAQueryFile, PagesInBothDirectionsThenPastTheEndAndFailures)
+{
+    RawDb(PathOf("q.db"))
+        .Run("CREATE TABLE items(n INTEGER, label TEXT);"
+             "INSERT INTO items VALUES (3, 'c'), (1, 'a'), (5, 'e'), (2, 'b'), (4, 'd');");
+    const std::vector<Strings> pages[] = {{{"a", "b"}, {"c", "d"}, {"e"}, {}}, {{"e", "d"}, {"c", "b"}, {"a"}, {}}};
+    for (int page = 0; page < 4; ++page) {
+        for (const bool descending : {false, true}) {
+            DACursor cursor;
+            cursor.SetColumn("mine");  // emptied by the query, even for a page past the end
+            EXPECT_EQ(0, Query(Dir(), "items", descending, page * 2, cursor));
+            EXPECT_EQ(page == 3 ? -1 : static_cast<int>(pages[descending][page].size()), cursor.GetCount());
+            EXPECT_EQ(pages[descending][page], ColumnValues(cursor, "label"));
+        }
+    }
+    DACursor kept;
+    kept.SetColumn("mine");
+    LogCapture log;
+    EXPECT_EQ(1, Query(Dir(), "missing", false, 0, kept));
+    EXPECT_EQ(14, Query(PathOf("none"), "items", false, 0, kept));
+    EXPECT_EQ(0, kept.GetCount());
+    EXPECT_EQ((Strings{"6 DADatabase.cpp:Query > QUERY FAILED[1]: no such table: missing",
+                       "6 DADatabase.cpp:OpenDB > DB open failed. Error no(14): unable to open database file",
+                       "4 DADatabase.cpp:Query > OpenDB Error: 14"}),
+              Described(log));
+}
+
+// Whether SetData(column, T) names exactly one overload.
+template <typename T>
+std::true_type CanSet(decltype(std::declval<DABaseSet&>().SetData("c", std::declval<T>()))*);
+template <typename T>
+std::false_type CanSet(...);
+template <typename T>
+using CanSetData = decltype(CanSet<T>(nullptr));
+// std::int64_t is long on x86_64 (a long long call stays ambiguous) and
+// long long on armhf (a long call stays ambiguous), as without it.
+static_assert(CanSetData<long>::value == std::is_same<long, std::int64_t>::value, "long");
+static_assert(CanSetData<long long>::value == std::is_same<long long, std::int64_t>::value, "long long");
+
+struct Grouping : std::numpunct<char> {
+    char do_thousands_sep() const override { return ','; }
+    std::string do_grouping() const override { return "\3"; }
+};
+
+// The text SetData stores for value.
+template <typename T>
+std::string Stored(T value)
+{
+    DABaseSet set;
+    set.SetData("c", value);
+    DAValueMap data;
+    set.GetDataMap(data);
+    return data.begin()->second;
+}
+
+// Under a locale that groups digits the int overload's stream groups them
+// and the 64-bit overload never does: that tells which one ran.
+TEST(DAInt64, EachArgumentTypeKeepsItsOverload)
+{
+    const std::locale old = std::locale::global(std::locale(std::locale::classic(), new Grouping));
+    EXPECT_EQ("1,234,567", Stored(1234567));
+    EXPECT_EQ("1234567", Stored(std::int64_t{1234567}));
+    EXPECT_EQ("1.09951e+12", Stored(1099511627776.0));
+    EXPECT_EQ("12,345", Stored("12,345"));
+    EXPECT_EQ("1234567", Stored(static_cast<std::conditional_t<CanSetData<long>::value, long, long long>>(1234567)));
+    std::locale::global(old);
+}
+
+// Both ends of the range, one past each, and 13-digit stamps written by
+// the library (n is NULL, so first) and by SQLite.
+TEST_F(DAQueryFile, GetInt64ReadsTheRangeAndStampsFromEitherWriter)
+{
+    RawDb(PathOf("q.db"))
+        .Run("CREATE TABLE t(n INTEGER, v); INSERT INTO t VALUES (1, -9223372036854775808),"
+             "(2, 9223372036854775807), (3, '-9223372036854775809'), (4, '9223372036854775808'),"
+             "(5, 1700000000456)");
+    DAUpsertRequest upsert;
+    upsert.SetPath(Dir().c_str(), "q.db");
+    upsert.SetTable("t");
+    upsert.SetData("v", std::int64_t{1700000000123});
+    ASSERT_EQ(0, DADatabase().Upsert(upsert));
+    DACursor cursor;
+    ASSERT_EQ(0, Query(Dir(), "t", false, 0, cursor, -1));
+    const std::int64_t reads[] = {1700000000123, INT64_MIN, INT64_MAX, 0, 0, 1700000000456};  // 0: fails
+    LogCapture log;
+    for (const std::int64_t expected : reads) {
+        ASSERT_EQ(0, cursor.MoveToNext());
+        std::int64_t value = 42;
+        EXPECT_EQ(expected == 0 ? 1 : 0, cursor.GetInt64("v", value));
+        EXPECT_EQ(expected == 0 ? 42 : expected, value);
+    }
+    EXPECT_EQ(Strings(2, "6 DACursor.cpp:GetInt64 > CONVERT TO INT ERROR!!!"), Described(log));
+}
+
+// Threads intern the same run-time names at once, each in its own order
+// (odd strides over 256): one pointer per text, holding the text.
+TEST(DAColumnName, OnePointerPerTextFromManyThreadsNamesEachColumnOnce)
+{
+    std::vector<std::vector<const char*>> seen(8, std::vector<const char*>(256));
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 8; ++t) {
+        threads.emplace_back([t, &seen] {
+            for (int i = 0; i < 256; ++i) {
+                const int n = (i * (2 * t + 1)) % 256;
+                seen[t][n] = DAColumnName::Intern(("col_" + std::to_string(n)).c_str());
+            }
+        });
+    }
+    std::for_each(threads.begin(), threads.end(), [](std::thread& thread) { thread.join(); });
+    for (int n = 0; n < 256; ++n) {
+        EXPECT_STREQ(("col_" + std::to_string(n)).c_str(), seen[0][n]);
+        EXPECT_EQ(8, std::count_if(seen.begin(), seen.end(), [&](const auto& s) { return s[n] == seen[0][n]; }));
+    }
+    EXPECT_EQ(nullptr, DAColumnName::Intern(nullptr));
+
+    DABaseSet set;  // names rebuilt in every round: each column once, first value kept
+    for (int i = 0; i < 9; ++i) {  // three rounds over three columns
+        set.SetData(DAColumnName::Intern(("col_" + std::to_string(i % 3)).c_str()), i / 3);
+    }
+    DAValueMap data;
+    set.GetDataMap(data);
+    EXPECT_EQ((DAValueMap{{seen[0][0], "0"}, {seen[0][1], "0"}, {seen[0][2], "0"}}), data);
+}
+
+}  // namespace
