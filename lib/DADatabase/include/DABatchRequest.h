@@ -1,6 +1,7 @@
 #ifndef DABATCHREQUEST_H
 #define DABATCHREQUEST_H
 
+#include <string>
 #include <vector>
 
 #include "DABasePath.h"
@@ -77,6 +78,11 @@ private:
     std::vector<char> m_texts;
     int m_count = 0;
     int m_changes = 0;
+    // Add's scratch for comparing locations.
+    std::string m_requestDir;
+    std::string m_requestFile;
+    std::string m_ownDir;
+    std::string m_ownFile;
 };
 
 #endif  // DABATCHREQUEST_H

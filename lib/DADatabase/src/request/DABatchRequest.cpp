@@ -31,6 +31,15 @@ int DABatchRequest::CheckLocation(DABasePath& request)
     if (request.IsPathEmpty()) {
         return SQLITE_OK;
     }
+    if (request.IsPathSet() && IsPathSet()) {
+        // Equal parts name the same file: the usual case, compared in
+        // buffers that keep their capacity from one Add to the next.
+        request.GetPath(m_requestDir, m_requestFile);
+        GetPath(m_ownDir, m_ownFile);
+        if (m_requestDir == m_ownDir && m_requestFile == m_ownFile) {
+            return SQLITE_OK;
+        }
+    }
     const std::string requested = JoinedPath(request);
     const std::string own = JoinedPath(*this);
     if (request.IsPathSet() && IsPathSet() && requested == own) {
