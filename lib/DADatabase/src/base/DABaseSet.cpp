@@ -6,7 +6,6 @@
 #include <sstream>
 #include <stdexcept>
 #include <system_error>
-#include <type_traits>
 
 #include "DALog.h"
 #include "DAMemberLock.h"
@@ -21,22 +20,30 @@ std::string ValueText(char const* value)
     return value;
 }
 
+// What a stream under the classic locale writes: to_chars is specified as
+// printf's %d and %.6g in the C locale.
+template <typename Integer>
+std::to_chars_result ClassicChars(char* first, char* last, Integer value)
+{
+    return std::to_chars(first, last, value);
+}
+
+std::to_chars_result ClassicChars(char* first, char* last, double value)
+{
+    return std::to_chars(first, last, value, std::chars_format::general, 6);
+}
+
 template <typename Number>
 std::string ValueText(Number value)
 {
-    // Under the classic locale the stream's text is what to_chars writes
-    // (printf's %d and %.6g in the C locale), at a fraction of the cost of
-    // building a stream: bulk writes fill many requests.
+    // Without a stream while the global locale is the classic one: building
+    // a stream per value cost more than the rest of a setter, and bulk
+    // writes fill many requests.
     if (std::locale() == std::locale::classic()) {
         std::array<char, 32> text{};
-        std::to_chars_result result{};
-        if constexpr (std::is_floating_point_v<Number>) {
-            result = std::to_chars(text.begin(), text.end(), value, std::chars_format::general, 6);
-        } else {
-            result = std::to_chars(text.begin(), text.end(), value);
-        }
+        const std::to_chars_result result = ClassicChars(text.data(), text.data() + text.size(), value);
         if (result.ec == std::errc()) {
-            return std::string(text.begin(), result.ptr);
+            return {text.data(), result.ptr};
         }
     }
     std::ostringstream stream;
