@@ -14,6 +14,26 @@ namespace bench {
 
 const std::vector<int> kSelectSizes = {1000, 10000, 100000, 1000000};
 
+benchmark::internal::Benchmark* Register(const std::string& name, std::function<void(benchmark::State&)> body,
+                                         int iterations)
+{
+    auto* registered = benchmark::RegisterBenchmark(name.c_str(), [body](benchmark::State& state) { body(state); })
+                           ->UseRealTime()
+                           ->Unit(benchmark::kMicrosecond);
+    if (iterations > 0) {
+        registered->Iterations(iterations);  // a fixed count excludes a minimum time
+    } else {
+        registered->MinTime(kMinTime);
+    }
+    return registered;
+}
+
+void Fail(benchmark::State& state, const char* what, int rc)
+{
+    const std::string message = std::string(what) + " failed: " + std::to_string(rc);
+    state.SkipWithError(message.c_str());
+}
+
 std::string SelectTable(int rows)
 {
     return "sel_" + std::to_string(rows);

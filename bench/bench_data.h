@@ -4,17 +4,32 @@
 // Data and raw-SQLite helpers shared by the benchmark program and the
 // memory probe: the same tables, filled the same way, read the same way.
 
+#include <functional>
 #include <string>
 #include <vector>
 
+#include <benchmark/benchmark.h>
+
 namespace bench {
 
-// A folder the benchmark program runs its cases in.
+// A folder the cases run in, made with MakeTempDir and removed at the end.
 struct Location {
     std::string name;  // "tmpfs" or "disk"
-    std::string dir;  // mkdtemp folder, removed at the end
+    std::string dir;
     std::string Path(const char* file) const { return dir + "/" + file; }
 };
+
+// Seconds per benchmark repetition, unless a case fixes its iterations.
+constexpr double kMinTime = 0.3;
+
+// Registers one case; every case measures wall-clock time (a commit to disk
+// waits without using the CPU). iterations > 0 fixes the count instead of
+// the minimum time.
+benchmark::internal::Benchmark* Register(const std::string& name, std::function<void(benchmark::State&)> body,
+                                         int iterations = 0);
+
+// Ends a case with "<what> failed: <rc>".
+void Fail(benchmark::State& state, const char* what, int rc);
 
 // The read-only database of the query cases, in every location.
 constexpr const char* kQueryFile = "query.db";
@@ -22,6 +37,9 @@ constexpr const char* kQueryFile = "query.db";
 // Registers the paged-query cases (bench_query.cpp) for every location, and
 // the column-name interning case once.
 void RegisterPageQueries(const std::vector<Location>& locations);
+
+// The batch cases at location (bench_batch.cpp).
+void RegisterBatch(const Location& location);
 
 // Row counts of the select tables ("sel_<N>").
 extern const std::vector<int> kSelectSizes;

@@ -37,14 +37,15 @@
 
 namespace {
 
+using bench::Fail;
 using bench::kQueryFile;
 using bench::Location;
+using bench::Register;
 
 constexpr const char* kWriteFile = "write.db";
 constexpr int kWriteRows = 100;  // rows of the write table w
 constexpr int kDeletePool = 1000;  // rows of the delete table d, refilled when used up
 constexpr int kWalkRows = 100000;  // rows of the cursor walk
-constexpr double kMinTime = 0.3;  // seconds per benchmark repetition
 
 std::vector<Location> g_locations;
 
@@ -131,28 +132,6 @@ bool PrepareWriteDatabase(const Location& location)
                                     ") INSERT OR REPLACE INTO w (id, qty, price, label) SELECT x, x, x * 0.5, "
                                     "'row-' || x FROM c") &&
         bench::RawExecScript(path, RefillDeletePoolSql());
-}
-
-void Fail(benchmark::State& state, const char* what, int rc)
-{
-    const std::string message = std::string(what) + " failed: " + std::to_string(rc);
-    state.SkipWithError(message.c_str());
-}
-
-// Registers one case; every case measures wall-clock time (a commit to disk
-// waits without using the CPU).
-benchmark::internal::Benchmark* Register(const std::string& name, std::function<void(benchmark::State&)> body,
-                                         int iterations = 0)
-{
-    auto* registered = benchmark::RegisterBenchmark(name.c_str(), [body](benchmark::State& state) { body(state); })
-                           ->UseRealTime()
-                           ->Unit(benchmark::kMicrosecond);
-    if (iterations > 0) {
-        registered->Iterations(iterations);  // a fixed count excludes a minimum time
-    } else {
-        registered->MinTime(kMinTime);
-    }
-    return registered;
 }
 
 // ---------------------------------------------------------------- writes
@@ -619,6 +598,7 @@ int main(int argc, char** argv)
     if (status == 0 && !g_locations.empty()) {
         for (const Location& location : g_locations) {
             RegisterWrites(location);
+            bench::RegisterBatch(location);
         }
         for (const Location& location : g_locations) {
             RegisterQueries(location, sizes);

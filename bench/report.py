@@ -28,6 +28,9 @@ CURSOR_MEMORY_TARGET = 1.1
 PAGE_SPEEDUP_TARGET = 100.0
 PAGE_RAW_TARGET = 1.8
 INTERN_TARGET_NS = 100.0
+BATCH_TARGET = 1.2
+BATCH_SINGLE_TARGET = 100.0
+BATCH_MEMORY_TARGET = 1.5
 
 UNIT_TO_US = {"ns": 1e-3, "us": 1.0, "ms": 1e3, "s": 1e6}
 
@@ -54,6 +57,65 @@ def load_bench(path):
     spread = {key: (min(values), max(values), len(values)) for key, values in samples.items()}
     result_bytes = {key: statistics.median(values) for key, values in held.items()}
     return data.get("context", {}), times, rates, spread, result_bytes
+
+
+def load_batch(path):
+    """Median real and CPU time and counters of the batch cases per (case, location, impl)."""
+    with open(path) as handle:
+        data = json.load(handle)
+    runs = defaultdict(lambda: defaultdict(list))
+    for run in data["benchmarks"]:
+        parts = run["run_name"].split("/")
+        if run.get("run_type") != "iteration" or run.get("error_occurred") or parts[0] != "batch":
+            continue
+        values = runs[tuple(parts[1:4])]
+        values["real"].append(run["real_time"] * UNIT_TO_US[run["time_unit"]])
+        values["cpu"].append(run["cpu_time"] * UNIT_TO_US[run["time_unit"]])
+        for name in ("statements", "held_bytes", "text_bytes"):
+            if name in run:
+                values[name].append(run[name])
+    return {key: {name: statistics.median(v) for name, v in values.items()} for key, values in runs.items()}
+
+
+def batch_tables(batch):
+    """The batch section and its summary rows; times scaled to the case's N statements."""
+    lines, summary = [], []
+    if not batch:
+        return lines, summary
+    lines += ["### Batches", "",
+              "N upserts through one `ExecuteBatch` (filling the requests and the batch included) against raw "
+              "SQLite building the same texts and running them with `sqlite3_exec` inside one "
+              "`BEGIN IMMEDIATE`/`COMMIT`, and against single `Upsert` calls. Single calls on disk run fewer "
+              "statements (counter `statements`); their time is scaled to N. Median real time (CPU time in "
+              "brackets).", "",
+              "| case | location | batch | raw one transaction | batch / raw | single calls (scaled) | "
+              "single / batch | held / text bytes |", "|---|---|---|---|---|---|---|---|"]
+    for (case, loc, impl), lib in sorted(batch.items()):
+        if impl != "lib":
+            continue
+        raw, single = batch.get((case, loc, "raw")), batch.get((case, loc, "single"))
+        n = lib["statements"]
+        ratio = lib["real"] / raw["real"] if raw else None
+        scaled = single["real"] * n / single["statements"] if single else None
+        memory = lib["held_bytes"] / lib["text_bytes"] if lib.get("text_bytes") else None
+        lines.append(f"| `{case}` | {loc} | {fmt_time(lib['real'])} ({fmt_time(lib['cpu'])}) | "
+                     + (f"{fmt_time(raw['real'])} ({fmt_time(raw['cpu'])}) | {ratio:.3f} | " if raw else "— | — | ")
+                     + (f"{fmt_time(scaled)} ({single['statements']:.0f} run) | {scaled / lib['real']:.0f} | "
+                        if single else "— | — | ")
+                     + (f"{lib['held_bytes']:.0f} / {lib['text_bytes']:.0f} = {memory:.3f} |" if memory else "— |"))
+        if ratio is not None:
+            summary.append((f"`ExecuteBatch` {case}, {loc}", fmt_time(lib["real"]), f"raw {fmt_time(raw['real'])}",
+                            f"{ratio:.3f}", f"≤ {BATCH_TARGET} × raw", ratio <= BATCH_TARGET))
+        if scaled is not None and loc == "disk":
+            summary.append((f"`ExecuteBatch` {case} against single calls, disk", fmt_time(lib["real"]),
+                            f"single {fmt_time(scaled)}", f"{scaled / lib['real']:.0f}",
+                            f"≥ {BATCH_SINGLE_TARGET:.0f} × faster", scaled / lib["real"] >= BATCH_SINGLE_TARGET))
+        if memory is not None and loc == "tmpfs":
+            summary.append((f"batch memory, {case}", f"{lib['held_bytes'] / 1024:.0f} KiB",
+                            f"texts {lib['text_bytes'] / 1024:.0f} KiB", f"{memory:.3f}",
+                            f"≤ {BATCH_MEMORY_TARGET} × texts", memory <= BATCH_MEMORY_TARGET))
+    lines.append("")
+    return lines, summary
 
 
 def load_memory(path):
@@ -176,7 +238,7 @@ def page_tables(times, result_bytes, locations):
     return lines, summary
 
 
-def build_tables(times, rates, spread, memory, result_bytes=None):
+def build_tables(times, rates, spread, memory, result_bytes=None, batch=None):
     lines = []
     summary = []
     locations = [loc for loc in ("tmpfs", "disk") if any(k[2] == loc for k in times)]
@@ -329,6 +391,9 @@ def build_tables(times, rates, spread, memory, result_bytes=None):
     page_lines, page_summary = page_tables(times, result_bytes or {}, locations)
     lines += page_lines
     summary += page_summary
+    batch_lines, batch_summary = batch_tables(batch)
+    lines += batch_lines
+    summary += batch_summary
 
     head = ["### Summary against the targets", "",
             "| case | library | baseline(s) | ratio | target | met? |", "|---|---|---|---|---|---|"]
@@ -385,7 +450,7 @@ def main():
 
     context, times, rates, spread, result_bytes = load_bench(args.bench)
     memory = load_memory(args.memory)
-    tables, per_row = build_tables(times, rates, spread, memory, result_bytes)
+    tables, per_row = build_tables(times, rates, spread, memory, result_bytes, load_batch(args.bench))
     plot(per_row, args.img)
 
     generated = ["## Results", "", "Generated by `scripts/bench.sh` from the run below; do not edit by hand.", "",

@@ -1,6 +1,7 @@
 // A tour of libulo_db on a real database file: create two related tables,
 // write, query, join, list a table sorted and a page at a time, store a
-// 64-bit time stamp, name columns at run time, check and drop, printing each step's result code, the
+// 64-bit time stamp, name columns at run time, check and drop, write in a
+// batch, printing each step's result code, the
 // statement the library generated, every result as a table, and the
 // library's own log lines as they are written.
 //
@@ -351,6 +352,60 @@ void CheckAndDrop(DADatabase& db, DASqlGenerator& generator, const char* dir)
     Write(db, "Drop the scratch table", drop, &DASqlGenerator::GetDropTableSql, &DADatabase::DropTable);
 }
 
+// Many writes as one batch: one open, one transaction, one commit, all or
+// nothing, instead of one open and one commit per write.
+void WriteBatch(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    const int readings = 200;
+    DABatchRequest batch;
+    batch.SetPath(dir, kFile);
+    DACreateRequest create;
+    SetLocation(create, dir, "readings");
+    create.SetPrimaryKey(kId, "INTEGER");
+    create.SetColumnKey("value", "REAL");
+    batch.Add(create);
+    std::string first;
+    for (int i = 1; i <= readings; ++i) {
+        DAUpsertRequest upsert;  // no location: it runs at the batch's
+        upsert.SetTable("readings");
+        upsert.SetData(kId, i);
+        upsert.SetData("value", i * 0.25);
+        if (i == 1) {
+            generator.GetUpsertSql(upsert, first);
+        }
+        batch.Add(upsert);
+    }
+    Step("Batch: create readings and upsert 200 rows in one transaction", first + "  (first of 200)");
+    std::printf("   statements held: %d\n", batch.GetCount());
+    Result(db.ExecuteBatch(batch), SQLITE_OK);
+    std::printf("   rows changed: %d\n", batch.GetChanges());
+    std::printf("   files opened: 1 and commits: 1, against %d of each as single calls\n", batch.GetCount());
+
+    DABatchRequest broken;
+    broken.SetPath(dir, kFile);
+    DAUpsertRequest good;
+    good.SetTable("readings");
+    good.SetData(kId, readings + 1);
+    good.SetData("value", 0.5);
+    DAUpsertRequest bad;
+    bad.SetTable("no_such_table");
+    bad.SetData(kId, 1);
+    broken.Add(good);
+    broken.Add(bad);
+    generator.GetUpsertSql(bad, first);
+    Step("Batch whose second statement fails (on purpose): nothing of it lands", first);
+    Result(db.ExecuteBatch(broken), SQLITE_ERROR);
+    DASelectRequest all;
+    SetLocation(all, dir, "readings");
+    DACursor cursor;
+    db.Select(all, cursor);
+    std::printf("   readings rows: %d\n", cursor.GetCount());
+
+    DADropRequest drop;
+    SetLocation(drop, dir, "readings");
+    Write(db, "Drop readings", drop, &DASqlGenerator::GetDropTableSql, &DADatabase::DropTable);
+}
+
 }  // namespace
 
 int main(int argc, char** argv)
@@ -373,6 +428,7 @@ int main(int argc, char** argv)
     TimeStamps(db, generator, dir);
     RunTimeNames(db, generator, dir);
     CheckAndDrop(db, generator, dir);
+    WriteBatch(db, generator, dir);
 
     std::printf("\n%s\n", g_unexpected == 0 ? "Every step gave the expected result." : "Some steps failed.");
     return g_unexpected == 0 ? 0 : 1;

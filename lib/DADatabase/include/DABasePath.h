@@ -26,6 +26,13 @@ public:
     /// holds the directory).
     void GetPath(std::string& dir, std::string& file);
 
+    /// True when both the directory and the file name are set, that is when
+    /// GetPath will not throw. Reads only; never locks.
+    bool IsPathSet() const { return m_directory.IsSet() && m_fileName.IsSet(); }
+
+    /// True when neither the directory nor the file name is set.
+    bool IsPathEmpty() const { return !m_directory.IsSet() && !m_fileName.IsSet(); }
+
 private:
     DAOwnedString m_directory;
     DAOwnedString m_fileName;

@@ -6,6 +6,7 @@
 #include <sqlite3.h>
 
 #include "DABasePath.h"
+#include "DABatchRequest.h"
 #include "DACreateRequest.h"
 #include "DACursor.h"
 #include "DADeleteRequest.h"
@@ -56,6 +57,22 @@ public:
     int Upsert(DAUpsertRequest& request);
     int CreateTable(DACreateRequest& request);
     ///@}
+
+    /// Runs every statement of batch, in Add order, in one transaction on
+    /// one connection at the batch's location: all of them land or none.
+    /// An empty batch returns 0 at once (nothing opened, nothing logged).
+    /// Otherwise opens with OpenDB (its lines and code on failure), runs
+    /// "BEGIN IMMEDIATE", each statement and "COMMIT", each under the
+    /// busy-retry rule. On success logs "ExecuteBatch SUCCESS[0]: n
+    /// statements" (info), sets batch.GetChanges() and returns 0. On the
+    /// first failure rolls back, logs "ExecuteBatch FAILED[rc] at i/n:
+    /// SQLite's text" (error; i is 0 for the begin, 1..n for the
+    /// statements, n + 1 for the commit) and returns rc; the file then
+    /// holds exactly what it held before. The connection is closed on
+    /// every way out. An incomplete batch location throws std::logic_error
+    /// before anything is opened. The batch is only read (but for its
+    /// change count) and may be executed again.
+    int ExecuteBatch(DABatchRequest& batch);
 
     ///@{
     /// Queries. Return the open's code if it failed, else the preparation's

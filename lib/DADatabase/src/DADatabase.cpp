@@ -1,5 +1,6 @@
 #include "DADatabase.h"
 
+#include <cstring>
 #include <stdexcept>
 
 #include "DABusyRetry.h"
@@ -22,6 +23,26 @@ int OpenLocation(DADatabase& database, DABasePath& location, DAConnection& db)
     return rc;
 }
 
+// sqlite3_exec of sql under busy-retry; error holds the text of the last
+// attempt (the text of a busy attempt is released before the next).
+int ExecWhileBusy(DADatabase& database, sqlite3* db, const char* sql, DAErrorText& error)
+{
+    return DARetryWhileBusy(database, [&] {
+        error.reset();
+        char* text = nullptr;
+        const int result = sqlite3_exec(db, sql, nullptr, nullptr, &text);
+        error.reset(text);
+        return result;
+    });
+}
+
+// The text of a failed exec: sqlite3_exec gives none when it runs out of
+// memory.
+const char* FailureText(const DAErrorText& error, int rc)
+{
+    return error != nullptr ? error.get() : sqlite3_errstr(rc);
+}
+
 // The frame every write operation shares: open, generate, execute under
 // busy-retry, log "<word> SUCCESS[0]" or "<word> FAILED[rc]: text" under
 // func, release, return the code.
@@ -39,18 +60,11 @@ int Execute(DADatabase& database, Request& request, void (DASqlGenerator::*gener
     (generator.*generate)(request, sql);
 
     DAErrorText error;
-    rc = DARetryWhileBusy(database, [&] {
-        error.reset();
-        char* text = nullptr;
-        const int result = sqlite3_exec(db.get(), sql.c_str(), nullptr, nullptr, &text);
-        error.reset(text);
-        return result;
-    });
+    rc = ExecWhileBusy(database, db.get(), sql.c_str(), error);
     if (rc == SQLITE_OK) {
         DA_LOG_AT(DLOG_INFO, func, "%s SUCCESS[%d]", word, rc);
     } else {
-        // sqlite3_exec gives no text when it runs out of memory.
-        DA_LOG_AT(DLOG_ERROR, func, "%s FAILED[%d]: %s", word, rc, error != nullptr ? error.get() : sqlite3_errstr(rc));
+        DA_LOG_AT(DLOG_ERROR, func, "%s FAILED[%d]: %s", word, rc, FailureText(error, rc));
     }
     return rc;
 }
@@ -142,6 +156,47 @@ int DADatabase::Upsert(DAUpsertRequest& request)
 int DADatabase::CreateTable(DACreateRequest& request)
 {
     return Execute(*this, request, &DASqlGenerator::GetCreateTableSql, __func__, "createTable");
+}
+
+int DADatabase::ExecuteBatch(DABatchRequest& batch)
+{
+    const int count = batch.m_count;
+    if (count == 0) {
+        return SQLITE_OK;
+    }
+    DAConnection db;
+    int rc = OpenLocation(*this, batch, db);
+    if (rc != SQLITE_OK) {
+        return rc;
+    }
+    // IMMEDIATE takes the write lock now, so a busy file shows (and is
+    // waited for) before any statement runs.
+    DAErrorText error;
+    int step = 0;  // 0 the begin, 1..count the statements, count + 1 the commit
+    rc = ExecWhileBusy(*this, db.get(), "BEGIN IMMEDIATE", error);
+    const int before = sqlite3_total_changes(db.get());
+    const char* sql = batch.m_texts.data();
+    while (rc == SQLITE_OK && step < count) {
+        ++step;
+        rc = ExecWhileBusy(*this, db.get(), sql, error);
+        sql += std::strlen(sql) + 1;
+    }
+    if (rc == SQLITE_OK) {
+        step = count + 1;
+        const int changes = sqlite3_total_changes(db.get()) - before;
+        rc = ExecWhileBusy(*this, db.get(), "COMMIT", error);
+        if (rc == SQLITE_OK) {
+            batch.m_changes = changes;
+            DA_LOG(DLOG_INFO, "ExecuteBatch SUCCESS[%d]: %d statements", rc, count);
+            return rc;
+        }
+    }
+    // Some failures end the transaction inside SQLite already.
+    if (sqlite3_get_autocommit(db.get()) == 0) {
+        sqlite3_exec(db.get(), "ROLLBACK", nullptr, nullptr, nullptr);
+    }
+    DA_LOG(DLOG_ERROR, "ExecuteBatch FAILED[%d] at %d/%d: %s", rc, step, count, FailureText(error, rc));
+    return rc;
 }
 
 // The frame is called as ::Query: inside the class the name Query means

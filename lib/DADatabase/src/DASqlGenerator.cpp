@@ -190,7 +190,12 @@ void DASqlGenerator::GetUpsertSql(DAUpsertRequest& request, std::string& sql)
     columns += ") ";
     CutAtLast(values, ", ");
     values += ')';
-    sql = "INSERT OR REPLACE INTO " + table + columns + values;
+    // Built in one buffer of the final size: batches write many of these.
+    const char* const head = "INSERT OR REPLACE INTO ";
+    std::string text;
+    text.reserve(std::char_traits<char>::length(head) + table.size() + columns.size() + values.size());
+    text.append(head).append(table).append(columns).append(values);
+    sql = std::move(text);
 }
 
 void DASqlGenerator::GetUpdateSql(DAUpdateRequest& request, std::string& sql)

@@ -1,8 +1,11 @@
 #include "DABaseSet.h"
 
+#include <array>
 #include <charconv>
+#include <locale>
 #include <sstream>
 #include <stdexcept>
+#include <system_error>
 
 #include "DALog.h"
 #include "DAMemberLock.h"
@@ -17,21 +20,54 @@ std::string ValueText(char const* value)
     return value;
 }
 
+// to_chars in the shape of a default stream: integers plain, doubles as %.6g.
+template <typename Integer>
+std::to_chars_result ClassicChars(char* first, char* last, Integer value)
+{
+    return std::to_chars(first, last, value);
+}
+
+std::to_chars_result ClassicChars(char* first, char* last, double value)
+{
+    return std::to_chars(first, last, value, std::chars_format::general, 6);
+}
+
+// A number's text by to_chars: what a stream writes under the classic
+// locale (to_chars is specified as printf's %d and %.6g in the C locale).
+template <typename Number>
+bool CharsText(Number value, std::string& out)
+{
+    std::array<char, 32> text{};
+    const std::to_chars_result result = ClassicChars(text.data(), text.data() + text.size(), value);
+    if (result.ec != std::errc()) {
+        return false;
+    }
+    out.assign(text.data(), result.ptr);
+    return true;
+}
+
 template <typename Number>
 std::string ValueText(Number value)
 {
+    // Without a stream while the global locale is the classic one: building
+    // a stream per value cost more than the rest of a setter, and bulk
+    // writes fill many requests.
+    std::string text;
+    if (std::locale() == std::locale::classic() && CharsText(value, text)) {
+        return text;
+    }
     std::ostringstream stream;
     stream << value;
     return stream.str();
 }
 
-// 64-bit values are written without the stream: to_chars ignores the
-// locale, so a time stamp never picks up digit grouping.
+// 64-bit values never go through a stream, so a time stamp never picks up
+// the digit grouping of the global locale.
 std::string ValueText(std::int64_t value)
 {
-    char text[24];  // "-9223372036854775808" is 20 characters
-    const std::to_chars_result end = std::to_chars(text, text + sizeof text, value);
-    return {text, end.ptr};
+    std::string text;
+    CharsText(value, text);  // 32 characters always suffice
+    return text;
 }
 
 // The one insertion all the setters make: refuse a null column, then build

@@ -1,0 +1,88 @@
+#ifndef DABATCHREQUEST_H
+#define DABATCHREQUEST_H
+
+#include <string>
+#include <vector>
+
+#include "DABasePath.h"
+#include "DACreateRequest.h"
+#include "DADeleteRequest.h"
+#include "DADropRequest.h"
+#include "DAUpdateRequest.h"
+#include "DAUpsertRequest.h"
+
+/// Many write statements for one database file, which
+/// DADatabase::ExecuteBatch runs in one transaction on one connection:
+/// all of them land, or none.
+///
+/// The batch's own location (SetPath) is the file the statements run on.
+/// Add writes a request's statement at once, with the generator function
+/// the request's own operation uses, and keeps only the text: the request
+/// may be changed or destroyed afterwards. The texts are kept one after
+/// another in a single buffer, so a batch holds little more than the
+/// statements' own bytes.
+///
+/// Location rule of Add: a request with no location at all runs at the
+/// batch's location. A request whose location is set (both parts) must
+/// name the same file as the batch's location at the time of the Add
+/// (the joined paths are compared as texts). Anything else is refused: a
+/// request naming another file, a request with only one part of its
+/// location set, or any located request while the batch's own location is
+/// incomplete. A refused Add returns SQLITE_MISUSE (21), logs one error
+/// line "Add FAILED[21]: request location <path> is not the batch's <path>"
+/// (an incomplete location reads "(incomplete)") and adds nothing.
+/// Changing the batch's location later moves every held statement to the
+/// new location.
+///
+/// A batch is filled by one thread at a time (like a cursor); it takes no
+/// lock. Any number of batches may execute at once, each on its own
+/// connection. Not copyable. No exceptions of its own: std::bad_alloc
+/// passes through and leaves the batch as it was before the call.
+class DABatchRequest : public DABasePath {
+public:
+    DABatchRequest() = default;
+    ~DABatchRequest() override = default;
+
+    /// Writes the request's statement (as Upsert, Update, Delete,
+    /// CreateTable or DropTable would) and keeps it after those held.
+    /// Returns 0, or 21 when refused by the location rule above.
+    int Add(DAUpsertRequest& request);
+    int Add(DAUpdateRequest& request);
+    int Add(DADeleteRequest& request);
+    int Add(DACreateRequest& request);
+    int Add(DADropRequest& request);
+
+    /// The number of statements held.
+    int GetCount() const { return m_count; }
+
+    /// Drops every statement held and releases their memory. The location
+    /// and GetChanges are kept.
+    void Clear();
+
+    /// Rows inserted, updated or deleted by the last successful
+    /// ExecuteBatch of this batch, as SQLite counts changes (statements
+    /// that create or drop tables count 0); 0 before any.
+    int GetChanges() const { return m_changes; }
+
+private:
+    friend class DADatabase;
+
+    template <typename Request, typename Generate>
+    int AddStatement(Request& request, Generate generate);
+
+    // 0 when request may join the batch, else logs the refusal and
+    // returns SQLITE_MISUSE.
+    int CheckLocation(DABasePath& request);
+
+    // Every statement followed by its terminating NUL, in Add order.
+    std::vector<char> m_texts;
+    int m_count = 0;
+    int m_changes = 0;
+    // Add's scratch for comparing locations.
+    std::string m_requestDir;
+    std::string m_requestFile;
+    std::string m_ownDir;
+    std::string m_ownFile;
+};
+
+#endif  // DABATCHREQUEST_H
