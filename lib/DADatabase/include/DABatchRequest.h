@@ -43,6 +43,7 @@ public:
     DABatchRequest() = default;
     ~DABatchRequest() override = default;
 
+    ///@{
     /// Writes the request's statement (as Upsert, Update, Delete,
     /// CreateTable or DropTable would) and keeps it after those held.
     /// Returns 0, or 21 when refused by the location rule above.
@@ -51,6 +52,7 @@ public:
     int Add(DADeleteRequest& request);
     int Add(DACreateRequest& request);
     int Add(DADropRequest& request);
+    ///@}
 
     /// The number of statements held.
     int GetCount() const { return m_count; }
