@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
 # Static checks:
-#   1. clang-tidy (the repository's .clang-tidy) over the sources of the
+#   1. clang-tidy (the repository's .clang-tidy, as C++17: GCC needs no -std
+#      flag, so compile_commands.json has none) over the sources of the
 #      library and the platform stand-ins, any warning is an error; it reads
 #      compile_commands.json from a configure-only build in build-tidy;
 #   2. clang-format --dry-run --Werror over every tracked *.cpp and *.h;
@@ -42,7 +43,7 @@ mapfile -t sources < <(sed -nE 's/^ *"file": "(.*)",?$/\1/p' "$BUILD/compile_com
 status=0
 step "$TIDY over ${#sources[@]} sources ($("$TIDY" --version | sed -n 's/.*version \([0-9.]*\).*/\1/p'))"
 if printf '%s\n' "${sources[@]}" |
-    xargs -P "$JOBS" -n 2 "$TIDY" -p "$BUILD" --quiet --warnings-as-errors='*' 2> >(grep -v ' warnings generated\.$' >&2); then
+    xargs -P "$JOBS" -n 2 "$TIDY" -p "$BUILD" --extra-arg=-std=c++17 --quiet --warnings-as-errors='*' 2> >(grep -v ' warnings generated\.$' >&2); then
     echo "clang-tidy: clean"
 else
     echo "clang-tidy: FAILED" >&2
