@@ -20,6 +20,7 @@
 
 #include "DADatabase.h"
 #include "DatabaseTestUtil.h"
+#include "FaultTestUtil.h"
 #include "TempDirTest.h"
 #include "dlog.h"
 
@@ -34,10 +35,6 @@ bool FailNow(Allocator allocator)
 {
     return g_failAt > 0 && g_armed == allocator && ++g_calls == g_failAt;
 }
-
-// The files live on tmpfs where there is one: the library syncs every
-// commit, and this program commits some thousand times.
-const bool g_onTmpfs = access("/dev/shm", W_OK) == 0 && setenv("TMPDIR", "/dev/shm", 1) == 0;
 
 sqlite3_mem_methods g_default;
 void* Malloc(int size)

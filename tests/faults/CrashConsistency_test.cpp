@@ -13,6 +13,7 @@
 
 #include "DADatabase.h"
 #include "DatabaseTestUtil.h"
+#include "FaultTestUtil.h"
 #include "TempDirTest.h"
 #include "dlog.h"
 
