@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Installs, with apt-get, the Debian packages a group of jobs needs, and only
 # those that are missing (so a prepared machine is not touched).
-#   install-deps.sh GROUP...   groups: build arm static bench
+#   install-deps.sh GROUP...   groups: build arm static bench fuzz
 set -euo pipefail
 
 declare -A groups=(
@@ -9,6 +9,7 @@ declare -A groups=(
     [arm]="g++-arm-linux-gnueabihf qemu-user"
     [static]="clang-tidy clang-format"
     [bench]="libbenchmark-dev libsqlitecpp-dev gnuplot-nox python3"
+    [fuzz]="clang libclang-rt-14-dev"
 )
 
 wanted=()
