@@ -34,15 +34,14 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     int number = 0;
     double real = 0;
     const std::function<void()> actions[] = {
-        [&] { set->SetData(c, t), set->SetWhere(c, t); },
-        [&] { set->SetWhere(c, input.ConsumeIntegral<int>()), set->SetData(c, input.ConsumeFloatingPoint<double>()); },
+        [&] { set->SetWhere(c, t), set->SetWhere(c, input.ConsumeIntegral<int>()), set->SetData(c, 0.5 * size); },
         [&] { upsert.SetTable(t), update.SetTable(t), remove.SetTable(t), select.SetTable(t), drop.SetTable(t); },
         [&] { join.SetLeftJoin(t, c), join.SetRightJoin(c, t), create.SetTable(t), create.SetPrimaryKey(c, t); },
-        [&] { create.SetCompositeKey(t, c), create.SetColumnKey(c, t); },
+        [&] { create.SetCompositeKey(t, c), create.SetColumnKey(c, t), set->SetData(c, t); },
         [&] { cursor.SetColumn(input.ConsumeBool() ? c : t), cursor.SetData(c, t); },
         [&] { cursor.MoveToPosition(input.ConsumeIntegral<int>()), cursor.MoveToNext(), cursor.MoveToPrev(); },
         [&] { input.ConsumeBool() ? cursor.MoveToFirst() : cursor.MoveToLast(); },
-        [&] { cursor.GetString(c, text), cursor.GetInt(c, number), cursor.GetDouble(t, real); },
+        [&] { cursor.GetDouble(t, real), cursor.GetInt(c, number), cursor.GetString(c, text); },  // t is text: last
     };
     while (silent && input.remaining_bytes() > 0) {
         text = input.ConsumeRandomLengthString(40);

@@ -84,7 +84,7 @@ fuzz() {
     step "[fuzz] run 60 s"
     local corpus
     corpus=$(mktemp -d "${TMPDIR:-/tmp}/ulo_db_fuzz.XXXXXX")
-    (cd "$build" && ASAN_OPTIONS=detect_leaks=1 ./fuzz/ulo_db_fuzz -max_total_time=60 -print_final_stats=1 "$corpus")
+    (cd "$build" && ASAN_OPTIONS=detect_leaks=1 ./ulo_db_fuzz -max_total_time=60 -print_final_stats=1 "$corpus")
     rm -rf "$corpus"
 }
 

@@ -16,20 +16,14 @@
 #include <fstream>
 #include <functional>
 #include <iterator>
-#include <map>
 #include <new>
 #include <random>
 #include <regex>
-#include <string>
 #include <tuple>
 #include <utility>
 
-#include <gtest/gtest.h>
-#include <sqlite3.h>
-
 #include "DADatabase.h"
 #include "DatabaseTestUtil.h"
-#include "LogCapture.h"
 #include "TempDirTest.h"
 #include "dlog.h"
 
@@ -103,8 +97,7 @@ Strings Dump(DACursor& cursor)
 
 std::string FileBytes(const std::string& path)
 {
-    std::ifstream in(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+    return {std::istreambuf_iterator<char>(std::ifstream(path, std::ios::binary).rdbuf()), {}};
 }
 
 template <typename Request>
