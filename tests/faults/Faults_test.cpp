@@ -226,6 +226,7 @@ struct IoCase {
     const char* name;
     std::function<void(const std::string& dir, const std::string& file)> fault;
     const char* expected;  // "code|line" of a Select (when the line says so) or an Upsert
+    friend void PrintTo(const IoCase& c, std::ostream* os) { *os << c.name; }
 };
 
 const IoCase kIoCases[] = {
