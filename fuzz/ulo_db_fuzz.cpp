@@ -5,7 +5,6 @@
 #include <functional>
 #include <iterator>
 #include <string>
-#include <vector>
 
 #include <fuzzer/FuzzedDataProvider.h>
 
@@ -52,10 +51,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     }
     DASqlGenerator generator;
     std::string sql;
-    std::vector<std::string> columns;
     generator.GetDBPath(text, text, sql), generator.GetCheckTableSql(text, sql), generator.GetDropTableSql(drop, sql);
     generator.GetCreateTableSql(create, sql), generator.GetSelectSql(select, sql), generator.GetJoinSql(join, sql);
     generator.GetUpsertSql(upsert, sql), generator.GetUpdateSql(update, sql), generator.GetDeleteSql(remove, sql);
-    cursor.GetColumn(columns);
     return 0;
 }
