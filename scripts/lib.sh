@@ -22,6 +22,7 @@ declare -A ULO_GROUPS=(
     [docs]="doxygen"
     [bench]="libbenchmark-dev libsqlitecpp-dev gnuplot-nox python3"
     [package]="dpkg pkg-config"
+    [fuzz]="clang libclang-rt-14-dev"
 )
 
 step() { printf '\n==> %s\n' "$*"; }

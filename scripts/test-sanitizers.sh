@@ -3,7 +3,8 @@
 # every CTest test under it; any sanitizer report fails the run.
 #
 #   scripts/test-sanitizers.sh            # address, then thread
-#   scripts/test-sanitizers.sh address    # ASan + UBSan + LeakSanitizer -> build-asan
+#   scripts/test-sanitizers.sh address    # ASan + UBSan + LeakSanitizer -> build-asan,
+#                                         # then the libFuzzer target for 60 s -> build-fuzz
 #   scripts/test-sanitizers.sh thread     # TSan                         -> build-tsan
 #
 # Further arguments after the mode go to ctest (e.g. -R Concurrent).
@@ -66,8 +67,26 @@ run() {
     )
 }
 
+# The libFuzzer target needs clang: its own build, run for a bounded time
+# from an empty corpus (a crash, leak or sanitizer report fails the run).
+fuzz() {
+    local build=$ROOT/build-fuzz
+    ulo_install fuzz
+    step "[fuzz] configure and build $build"
+    CXX=clang++ ulo_configure "$build" -DULO_DB_BUILD_FUZZER=ON -DULO_DB_SANITIZER=address \
+        -DCMAKE_BUILD_TYPE=RelWithDebInfo -DULO_DB_BUILD_TESTS=OFF -DULO_DB_BUILD_EXAMPLES=OFF \
+        -DULO_DB_BUILD_BENCHMARKS=OFF -DULO_DB_BUILD_DOCS=OFF
+    cmake --build "$build" -j "$JOBS" --target ulo_db_fuzz
+    step "[fuzz] run 60 s"
+    local corpus
+    corpus=$(mktemp -d "${TMPDIR:-/tmp}/ulo_db_fuzz.XXXXXX")
+    (cd "$build" && ASAN_OPTIONS=detect_leaks=1 fuzz/ulo_db_fuzz -max_total_time=60 -print_final_stats=1 "$corpus")
+    rm -rf "$corpus"
+}
+
 for sanitizer in "${modes[@]}"; do
     start=$SECONDS
     run "$sanitizer" "$@"
+    if [[ $sanitizer == address ]]; then fuzz; fi
     echo "[$sanitizer] passed in $((SECONDS - start)) s"
 done
