@@ -8,9 +8,7 @@
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 
-#include "DACursor.h"
 #include "DatabaseTestUtil.h"
-#include "LogCapture.h"
 #include "TempDirTest.h"
 
 namespace {
@@ -64,7 +62,7 @@ const std::string kParser = "DADatabasePasrser.cpp";
 
 std::string Error(const std::string& function, const std::string& message)
 {
-    return "6 " + kParser + ":" + function + " > " + message;
+    return Logged(6, kParser, function, message);
 }
 
 }  // namespace

@@ -1,10 +1,6 @@
 #include "DADatabase.h"
 
-#include <unistd.h>
-
 #include <chrono>
-#include <cstdio>
-#include <fstream>
 #include <functional>
 #include <stdexcept>
 #include <string>
@@ -14,7 +10,6 @@
 #include <gtest/gtest.h>
 
 #include "DatabaseTestUtil.h"
-#include "LogCapture.h"
 #include "TempDirTest.h"
 
 namespace {
@@ -25,7 +20,7 @@ const char* const kContacts = "CREATE TABLE contacts(_ID INTEGER PRIMARY KEY, na
 
 std::string Line(int priority, const std::string& function, const std::string& message)
 {
-    return std::to_string(priority) + " DADatabase.cpp:" + function + " > " + message;
+    return Logged(priority, "DADatabase.cpp", function, message);
 }
 
 const std::string kOpenFailed = Line(6, "OpenDB", "DB open failed. Error no(14): unable to open database file");
@@ -162,14 +157,6 @@ TEST_P(DADatabaseWrite, FailureLineCarriesSqliteText)
     EXPECT_TRUE(FileExists(kFile));  // a missing file is created by the open
 }
 
-TEST_P(DADatabaseWrite, OpenFailsInAMissingDirectory)
-{
-    LogCapture log;
-    EXPECT_EQ(14, GetParam().run(m_db, PathOf("missing")));
-    EXPECT_EQ(Strings{kOpenFailed}, Described(log));
-    EXPECT_FALSE(FileExists("missing"));
-}
-
 INSTANTIATE_TEST_SUITE_P(Operations, DADatabaseWrite, ::testing::ValuesIn(kWriteCases),
                          [](const ::testing::TestParamInfo<WriteCase>& info) { return info.param.function; });
 
@@ -262,12 +249,6 @@ TEST_F(DADatabaseTest, SelectFailuresLeaveTheCursorAsItWas)
     EXPECT_EQ(1, m_db.Select(At(request, Dir(), "x"), cursor));
     EXPECT_EQ(Strings{Line(6, "Select", "SELECT FAILED[1]: no such table: x")}, Described(log));
     ExpectPreloaded(cursor);
-
-    log.Clear();
-    EXPECT_EQ(14, m_db.Select(At(request, PathOf("missing"), "contacts"), cursor));
-    EXPECT_EQ((Strings{kOpenFailed, Line(4, "Select", "OpenDB Error: 14")}), Described(log));
-    ExpectPreloaded(cursor);
-    EXPECT_FALSE(FileExists("missing"));
 }
 
 // Both tables carry the _ID column of tables made without a key, so the join
@@ -298,13 +279,11 @@ TEST_F(DADatabaseTest, JoinSelectRegistersTheSharedColumnTwice)
     log.Clear();
     join.SetLeftJoin("people", "group_id");
     EXPECT_EQ(1, m_db.JoinSelect(join, cursor));
-    join.SetPath(PathOf("missing").c_str(), kFile);
-    EXPECT_EQ(14, m_db.JoinSelect(join, cursor));
-    EXPECT_EQ((Strings{Line(6, "JoinSelect", "JoinSelect FAILED[1]: no such table: people"), kOpenFailed}),
-              Described(log));
+    EXPECT_EQ((Strings{Line(6, "JoinSelect", "JoinSelect FAILED[1]: no such table: people")}), Described(log));
     EXPECT_EQ(3, cursor.GetCount());
 }
 
+// A null name throws, and the file is closed on the way out.
 TEST_F(DADatabaseTest, CheckExistTableMatchesTablesByExactName)
 {
     Seed("CREATE TABLE Contacts(x); CREATE VIEW v AS SELECT 1;");
@@ -312,99 +291,50 @@ TEST_F(DADatabaseTest, CheckExistTableMatchesTablesByExactName)
     location.SetPath(Dir().c_str(), kFile);
     const std::pair<const char*, bool> cases[] = {
         {"Contacts", true}, {"contacts", false}, {"missing", false}, {"v", false}};
+    const int descriptors = OpenDescriptorCount();
     LogCapture log;
     for (const auto& c : cases) {
         bool exists = !c.second;
         EXPECT_EQ(0, m_db.CheckExistTable(location, c.first, exists)) << c.first;
         EXPECT_EQ(c.second, exists) << c.first;
     }
-    EXPECT_TRUE(log.Lines().empty());
-
-    location.SetPath(PathOf("missing").c_str(), kFile);
-    bool exists = true;
-    EXPECT_EQ(14, m_db.CheckExistTable(location, "Contacts", exists));
-    EXPECT_TRUE(exists);
-    EXPECT_EQ(Strings{kOpenFailed}, Described(log));
-}
-
-TEST_F(DADatabaseTest, CheckExistTableWithNullNameThrowsAndClosesTheFile)
-{
-    Seed(kContacts);
-    DABasePath location;
-    location.SetPath(Dir().c_str(), kFile);
-    const int descriptors = OpenDescriptorCount();
     bool exists = true;
     EXPECT_THROW(m_db.CheckExistTable(location, nullptr, exists), std::logic_error);
-    EXPECT_EQ(descriptors, OpenDescriptorCount());
     EXPECT_TRUE(exists);
+    EXPECT_EQ(descriptors, OpenDescriptorCount());
+    EXPECT_TRUE(log.Lines().empty());
 }
 
-class DADatabaseCliTest : public DADatabaseTest {
-protected:
-    void SetUp() override
-    {
-        DADatabaseTest::SetUp();
-        if (access(kCli, X_OK) != 0) {
-            GTEST_SKIP() << kCli << " is not installed";
-        }
-    }
-
-    // Runs sql through the sqlite3 program on the test's file; its output.
-    std::string Cli(const std::string& sql)
-    {
-        std::ofstream(PathOf("cli.sql")) << sql;
-        const std::string command =
-            std::string(kCli) + " -batch -separator '|' '" + PathOf(kFile) + "' < '" + PathOf("cli.sql") + "' 2>&1";
-        std::string out;
-        if (FILE* pipe = popen(command.c_str(), "r")) {
-            char buffer[256];
-            while (std::fgets(buffer, sizeof buffer, pipe) != nullptr) {
-                out += buffer;
-            }
-            EXPECT_EQ(0, pclose(pipe)) << out;
-        }
-        return out;
-    }
-
-    static constexpr const char* kCli = "/usr/bin/sqlite3";
-};
-
-TEST_F(DADatabaseCliTest, FileWrittenByTheLibraryReadsBackInSqlite3)
+// OpenDB hands back a null handle after a failed open and the open file
+// otherwise. Every operation opens through it: a failed open is the
+// operation's code with OpenDB's line, and Select adds an info line.
+TEST_F(DADatabaseTest, OpenDBHandsBackNullOnFailureAndEveryOperationItsCode)
 {
-    DACreateRequest create;
-    At(create, Dir(), "people").SetColumnKey("name", "TEXT");
-    create.SetColumnKey("age", "INTEGER");
-    create.SetColumnKey("height", "REAL");
-    ASSERT_EQ(0, m_db.CreateTable(create));
-    const struct {
-        const char* name;
-        int age;
-        double height;
-    } people[] = {{"Kim", 30, 1.75}, {"Lee", -4, 2.0}};
-    for (const auto& person : people) {
-        DAUpsertRequest row;
-        At(row, Dir(), "people").SetData("name", person.name);
-        row.SetData("age", person.age);
-        row.SetData("height", person.height);
-        ASSERT_EQ(0, m_db.Upsert(row));
-    }
-    EXPECT_EQ("1|Kim|30|integer|1.75\n2|Lee|-4|integer|2.0\n",
-              Cli("SELECT _ID, name, age, typeof(age), height FROM people ORDER BY _ID;"));
-}
+    LogCapture log;
+    sqlite3* handle = reinterpret_cast<sqlite3*>(&log);  // to see it replaced
+    EXPECT_EQ(14, m_db.OpenDB(handle, PathOf("missing"), kFile));
+    EXPECT_EQ(nullptr, handle);
+    ASSERT_EQ(0, m_db.OpenDB(handle, Dir(), kFile));
+    ASSERT_NE(nullptr, handle);
+    EXPECT_EQ(SQLITE_OK, sqlite3_exec(handle, "CREATE TABLE opened(x)", nullptr, nullptr, nullptr));
+    sqlite3_close(handle);
+    EXPECT_EQ("opened", Query("SELECT name FROM sqlite_master"));
 
-TEST_F(DADatabaseCliTest, FileWrittenBySqlite3ReadsBackInSelect)
-{
-    Cli("CREATE TABLE notes(id INTEGER PRIMARY KEY, body TEXT, score REAL);"
-        "INSERT INTO notes VALUES (1, 'hello', 2.5), (2, 'world', NULL);");
-    DASelectRequest request;
+    const std::string missing = PathOf("missing");
     DACursor cursor;
-    ASSERT_EQ(0, m_db.Select(At(request, Dir(), "notes"), cursor));
-    EXPECT_EQ(2, cursor.GetCount());
-    EXPECT_EQ((Strings{"1", "2"}), ColumnValues(cursor, "id"));
-    EXPECT_EQ((Strings{"hello", "world"}), ColumnValues(cursor, "body"));
-    EXPECT_EQ((Strings{"2.5", ""}), ColumnValues(cursor, "score"));
-    ASSERT_EQ(0, cursor.MoveToPosition(0));
-    double score = 0;
-    EXPECT_EQ(0, cursor.GetDouble("score", score));
-    EXPECT_EQ(2.5, score);
+    Preload(cursor);
+    DASelectRequest select;
+    DAJoinRequest join;
+    join.SetPath(missing.c_str(), kFile);
+    bool exists = true;
+    EXPECT_EQ(14, kWriteCases[0].run(m_db, missing));
+    EXPECT_EQ(14, m_db.Select(At(select, missing, "contacts"), cursor));
+    EXPECT_EQ(14, m_db.JoinSelect(join, cursor));
+    EXPECT_EQ(14, m_db.CheckExistTable(join, "contacts", exists));
+    EXPECT_EQ((Strings{kOpenFailed, kOpenFailed, kOpenFailed, Line(4, "Select", "OpenDB Error: 14"), kOpenFailed,
+                       kOpenFailed}),
+              Described(log));
+    ExpectPreloaded(cursor);
+    EXPECT_TRUE(exists);
+    EXPECT_FALSE(FileExists("missing"));
 }

@@ -155,6 +155,41 @@ TEST(ConcurrentCursorFill, EveryColumnAndValueLands)
     EXPECT_EQ(readAll, expectedAll);
 }
 
+// One thread loads while another empties the cursor again and again:
+// Initialize takes the lock loading takes, so names and stored columns
+// always agree, and every registered column holds its value.
+TEST(ConcurrentCursorFill, InitializeWhileAnotherThreadLoads)
+{
+    const auto names = MakeNames("i");
+    DACursor cursor;
+    std::atomic<bool> loaded{false};
+    std::thread loader([&] {
+        for (int round = 0; round < 1000; ++round) {
+            for (const std::string& name : names[round % kThreads]) {
+                cursor.SetColumn(name.c_str());
+                cursor.SetData(name.c_str(), "v");
+            }
+        }
+        loaded = true;
+    });
+    while (!loaded) {
+        cursor.Initialize();
+    }
+    loader.join();
+
+    Strings registered;
+    const bool any = cursor.GetColumn(registered) == 0;
+    EXPECT_EQ(any, cursor.GetCount() > 0);
+    const LogCapture log;
+    EXPECT_EQ(any ? 0 : 1, cursor.MoveToPosition(0));
+    for (const std::string& name : registered) {
+        std::string value;
+        EXPECT_EQ(cursor.GetString(name.c_str(), value), 0) << name;
+        EXPECT_EQ(value, "v") << name;
+    }
+    EXPECT_EQ(log.Lines().size(), any ? 0U : 1U);
+}
+
 // Each thread upserts fresh rows, updates each and reads it back, every call
 // with its own connection. Contention shows as SQLITE_BUSY and must be
 // absorbed by the busy-retry rule (up to 15 pauses of 100 ms).

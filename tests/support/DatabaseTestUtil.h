@@ -1,9 +1,9 @@
 #ifndef ULO_TESTS_DATABASETESTUTIL_H
 #define ULO_TESTS_DATABASETESTUTIL_H
 
-// Helpers shared by the tests that run on real database files: a raw
-// SQLite connection for seeding and checking files, a compact view of the
-// captured log lines, and the open-descriptor count of the process.
+// Helpers shared by the tests: a compact view of the captured log lines, a
+// raw SQLite connection for seeding and checking files, and the
+// open-descriptor count of the process.
 
 #include <dirent.h>
 
@@ -18,13 +18,20 @@
 
 using Strings = std::vector<std::string>;
 
-// Every captured line as "priority file:function > message", so a whole log
-// can be compared at once with a readable difference.
+// One log line as Described shows it: "priority file:function > message".
+inline std::string Logged(int priority, const std::string& file, const std::string& function,
+                          const std::string& message)
+{
+    return std::to_string(priority) + " " + file + ":" + function + " > " + message;
+}
+
+// Every captured line as Logged shows it, so a whole log can be compared at
+// once with a readable difference.
 inline Strings Described(const LogCapture& log)
 {
     Strings out;
     for (const LogLine& line : log.Lines()) {
-        out.push_back(std::to_string(line.priority) + " " + line.file + ":" + line.function + " > " + line.message);
+        out.push_back(Logged(line.priority, line.file, line.function, line.message));
     }
     return out;
 }
@@ -34,7 +41,7 @@ inline Strings BusyWarnings(const std::string& file, int n)
 {
     Strings out;
     for (int i = 1; i <= n; ++i) {
-        out.push_back("5 " + file + ":IsRetryLimit > SQLITE BUSY[" + std::to_string(i) + "]");
+        out.push_back(Logged(5, file, "IsRetryLimit", "SQLITE BUSY[" + std::to_string(i) + "]"));
     }
     return out;
 }

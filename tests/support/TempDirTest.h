@@ -1,6 +1,11 @@
 #ifndef ULO_TESTS_TEMPDIRTEST_H
 #define ULO_TESTS_TEMPDIRTEST_H
 
+#include <ftw.h>
+#include <sys/stat.h>
+
+#include <cstdio>
+#include <cstdlib>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -10,14 +15,32 @@
 // the test.
 class TempDirTest : public ::testing::Test {
 protected:
-    void SetUp() override;
-    void TearDown() override;
+    void SetUp() override
+    {
+        const char* base = std::getenv("TMPDIR");
+        std::string pattern = std::string(base != nullptr && *base != '\0' ? base : "/tmp") + "/ulo_db_test.XXXXXX";
+        ASSERT_NE(mkdtemp(&pattern[0]), nullptr) << "mkdtemp failed for " << pattern;
+        m_dir = pattern;
+    }
+
+    void TearDown() override
+    {
+        if (!m_dir.empty()) {
+            nftw(
+                m_dir.c_str(), [](const char* path, const struct stat*, int, struct FTW*) { return std::remove(path); },
+                16, FTW_DEPTH | FTW_PHYS);
+        }
+    }
 
     // The directory, without a trailing "/".
     const std::string& Dir() const { return m_dir; }
     // Dir() + "/" + name.
-    std::string PathOf(const std::string& name) const;
-    bool FileExists(const std::string& name) const;
+    std::string PathOf(const std::string& name) const { return m_dir + "/" + name; }
+    bool FileExists(const std::string& name) const
+    {
+        struct stat info {};
+        return stat(PathOf(name).c_str(), &info) == 0;
+    }
 
 private:
     std::string m_dir;

@@ -1,7 +1,6 @@
 #include <cstring>
 #include <stdexcept>
 #include <string>
-#include <type_traits>
 
 #include <gtest/gtest.h>
 
@@ -18,14 +17,6 @@
 #include "LogCapture.h"
 
 namespace {
-
-template <typename T>
-constexpr bool kNotCopyable = !std::is_copy_constructible<T>::value && !std::is_copy_assignable<T>::value;
-
-static_assert(kNotCopyable<DABasePath> && kNotCopyable<DABaseSet> && kNotCopyable<DASelectRequest> &&
-                  kNotCopyable<DAUpsertRequest> && kNotCopyable<DAUpdateRequest> && kNotCopyable<DADeleteRequest> &&
-                  kNotCopyable<DADropRequest> && kNotCopyable<DACreateRequest> && kNotCopyable<DAJoinRequest>,
-              "requests own raw copies of their names and must not be copied");
 
 // Every request class that names a table follows one SetTable/GetTable rule:
 // an unset name leaves the output alone, the name is copied at the call, a
@@ -119,7 +110,8 @@ TEST(DACreateRequest, NullColumnIsRefusedAndNullTypeThrowsReleasingTheLock)
     EXPECT_TRUE(ColumnsOf(request).empty());
     request.SetColumnKey(name, "TEXT");  // would deadlock if the lock were still held
     EXPECT_EQ(ColumnsOf(request), (DAColumnList{{name, "TEXT"}}));
-    EXPECT_EQ(Strings{"6 DACreateRequest.cpp:SetColumnKey > NULL COLUMN NAME, COLUMN NOT ADDED"}, Described(log));
+    EXPECT_EQ(Strings{Logged(6, "DACreateRequest.cpp", "SetColumnKey", "NULL COLUMN NAME, COLUMN NOT ADDED")},
+              Described(log));
 }
 
 }  // namespace
