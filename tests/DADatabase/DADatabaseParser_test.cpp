@@ -66,9 +66,9 @@ protected:
 // Any row with a positive count sets the answer; later rows never clear it.
 TEST_F(DADatabaseParserTest, ParseExistTableReadsTheCount)
 {
-    const std::pair<const char*, bool> cases[] = {
-        {"SELECT 0", false}, {"SELECT 1", true}, {"SELECT -1", false}, {"SELECT 1 WHERE 0", false},
-        {"SELECT v - 1 FROM t", true}, {"SELECT 2 - v FROM t", true}};
+    const std::pair<const char*, bool> cases[] = {{"SELECT 0", false},           {"SELECT 1", true},
+                                                  {"SELECT -1", false},          {"SELECT 1 WHERE 0", false},
+                                                  {"SELECT v - 1 FROM t", true}, {"SELECT 2 - v FROM t", true}};
     for (const auto& c : cases) {
         bool exists = !c.second;
         EXPECT_EQ(SQLITE_DONE, m_parser.ParseExistTable(Prepare(c.first), exists)) << c.first;

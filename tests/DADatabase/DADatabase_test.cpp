@@ -40,14 +40,6 @@ void Preload(DACursor& cursor)
     cursor.SetData("mine", "kept");
 }
 
-int UpsertContact(DADatabase& db, const std::string& dir)
-{
-    DAUpsertRequest request;
-    At(request, dir, "contacts").SetData("name", "Cho");
-    request.SetData("phone", "012");
-    return db.Upsert(request);
-}
-
 // One write operation: it succeeds on seed, leaving checked as the rows of
 // check; after breaking it fails with SQLite's failureText.
 struct WriteCase {
@@ -60,11 +52,6 @@ struct WriteCase {
     const char* failureText;
     std::function<int(DADatabase&, const std::string&)> run;
 };
-
-void PrintTo(const WriteCase& c, std::ostream* os)
-{
-    *os << c.function;
-}
 
 const char* const kNoContacts = "DROP TABLE IF EXISTS contacts";
 const WriteCase kWriteCases[] = {
@@ -156,7 +143,7 @@ TEST_F(DADatabaseTest, WriteAndSelectGiveUpWhileAnotherConnectionHoldsTheFile)
     holder.Run("BEGIN EXCLUSIVE");
     LogCapture log;
     const auto start = std::chrono::steady_clock::now();
-    EXPECT_EQ(5, UpsertContact(m_db, Dir()));
+    EXPECT_EQ(5, kWriteCases[3].run(m_db, Dir()));
     const double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
     Strings expected = BusyWarnings("DADatabase.cpp", 15);
     expected.push_back(Line(6, "IsRetryLimit", "RETRY COUNT is reached LIMIT, SQLITE_BUSY"));
@@ -187,7 +174,7 @@ TEST_F(DADatabaseTest, WriteSucceedsOnceTheOtherConnectionCommits)
         std::this_thread::sleep_for(std::chrono::milliseconds(250));
         holder.Run("COMMIT");
     });
-    const int rc = UpsertContact(m_db, Dir());
+    const int rc = kWriteCases[3].run(m_db, Dir());
     release.join();
     EXPECT_EQ(0, rc);
     Strings lines = Described(log);
@@ -196,7 +183,7 @@ TEST_F(DADatabaseTest, WriteSucceedsOnceTheOtherConnectionCommits)
     EXPECT_EQ(Line(4, "Upsert", "Upsert SUCCESS[0]"), lines.back());
     lines.pop_back();
     EXPECT_EQ(BusyWarnings("DADatabase.cpp", static_cast<int>(lines.size())), lines);
-    EXPECT_EQ("Kim|010;Lee|011;Cho|012", Query("SELECT name, phone FROM contacts ORDER BY _ID"));
+    EXPECT_EQ("Cho|012;Lee|011", Query("SELECT name, phone FROM contacts ORDER BY _ID"));
 }
 
 // Matching rows replace the cursor's content, no row empties it, and a

@@ -30,8 +30,9 @@ struct SqlCase {
     const char* expected;
 };
 
+// A request of the table kind: data from first, conditions from second.
 template <typename Request>
-Request& Filled(Request& request, const SqlCase& c)
+void Fill(Request& request, const SqlCase& c)
 {
     request.SetTable(c.table);
     for (const auto& entry : c.first) {
@@ -40,71 +41,76 @@ Request& Filled(Request& request, const SqlCase& c)
     for (const auto& entry : c.second) {
         request.SetWhere(entry.first, entry.second);
     }
-    return request;
 }
 
-// Builds the request of c and generates its statement into out.
-void Generate(const SqlCase& c, std::string& out)
+void Fill(DADropRequest& request, const SqlCase& c)
 {
-    DASqlGenerator g;
+    request.SetTable(c.table);
+}
+
+void Fill(DACreateRequest& request, const SqlCase& c)
+{
+    request.SetTable(c.table);
+    request.SetPrimaryKey(c.first.at(0).first, c.first.at(0).second);
+    request.SetCompositeKey(c.first.at(1).first, c.first.at(1).second);
+    for (const auto& column : c.second) {
+        request.SetColumnKey(column.first, column.second);
+    }
+}
+
+void Fill(DAJoinRequest& request, const SqlCase& c)
+{
+    request.SetLeftJoin(c.first.at(0).first, c.first.at(0).second);
+    request.SetRightJoin(c.first.at(1).first, c.first.at(1).second);
+    for (const auto& entry : c.second) {
+        request.SetWhere(entry.first, entry.second);
+    }
+}
+
+template <typename Request>
+std::string Generated(void (DASqlGenerator::*generate)(Request&, std::string&), const SqlCase& c)
+{
+    Request request;
+    Fill(request, c);
+    std::string out = "stale text that must disappear";
+    (DASqlGenerator().*generate)(request, out);
+    return out;
+}
+
+// The statement of c's request.
+std::string Generated(const SqlCase& c)
+{
+    std::string out = "stale text that must disappear";
     switch (c.kind) {
     case kPath:
-        return g.GetDBPath(c.first[0].first, c.first[0].second, out);
+        DASqlGenerator().GetDBPath(c.first[0].first, c.first[0].second, out);
+        return out;
     case kCheck:
-        return g.GetCheckTableSql(c.table, out);
-    case kDrop: {
-        DADropRequest request;
-        request.SetTable(c.table);
-        return g.GetDropTableSql(request, out);
+        DASqlGenerator().GetCheckTableSql(c.table, out);
+        return out;
+    case kDrop:
+        return Generated(&DASqlGenerator::GetDropTableSql, c);
+    case kCreate:
+        return Generated(&DASqlGenerator::GetCreateTableSql, c);
+    case kSelect:
+        return Generated(&DASqlGenerator::GetSelectSql, c);
+    case kJoin:
+        return Generated(&DASqlGenerator::GetJoinSql, c);
+    case kUpsert:
+        return Generated(&DASqlGenerator::GetUpsertSql, c);
+    case kUpdate:
+        return Generated(&DASqlGenerator::GetUpdateSql, c);
+    case kDelete:
+        return Generated(&DASqlGenerator::GetDeleteSql, c);
     }
-    case kCreate: {
-        DACreateRequest request;
-        request.SetTable(c.table);
-        if (!c.first.empty()) {
-            request.SetPrimaryKey(c.first[0].first, c.first[0].second);
-        }
-        if (c.first.size() > 1) {
-            request.SetCompositeKey(c.first[1].first, c.first[1].second);
-        }
-        for (const auto& column : c.second) {
-            request.SetColumnKey(column.first, column.second);
-        }
-        return g.GetCreateTableSql(request, out);
-    }
-    case kJoin: {
-        DAJoinRequest request;
-        request.SetLeftJoin(c.first[0].first, c.first[0].second);
-        request.SetRightJoin(c.first[1].first, c.first[1].second);
-        for (const auto& entry : c.second) {
-            request.SetWhere(entry.first, entry.second);
-        }
-        return g.GetJoinSql(request, out);
-    }
-    case kSelect: {
-        DASelectRequest request;
-        request.SetData(kPhone, "ignored");  // a select reads only the conditions
-        return g.GetSelectSql(Filled(request, c), out);
-    }
-    case kUpsert: {
-        DAUpsertRequest request;
-        request.SetWhere(kPhone, "ignored");  // an upsert reads only the data
-        return g.GetUpsertSql(Filled(request, c), out);
-    }
-    case kUpdate: {
-        DAUpdateRequest request;
-        return g.GetUpdateSql(Filled(request, c), out);
-    }
-    case kDelete: {
-        DADeleteRequest request;
-        request.SetData(kName, "ignored");  // a delete reads only the conditions
-        return g.GetDeleteSql(Filled(request, c), out);
-    }
-    }
+    return out;
 }
 
 const char* const kContacts = "contacts";
 const Pairs kNameText{{"name", "TEXT"}};
+const Pairs kNoKeys{{}, {}};
 
+// clang-format off
 const SqlCase kCases[] = {
     {kPath, nullptr, {{"/data/notes", "notes.db"}}, {}, "/data/notes/notes.db"},
     {kPath, nullptr, {{"/data/notes/", "notes.db"}}, {}, "/data/notes/notes.db"},
@@ -115,27 +121,28 @@ const SqlCase kCases[] = {
     {kPath, nullptr, {{"/data/notes", ""}}, {}, "/data/notes/"},
     {kCheck, kContacts, {}, {}, "SELECT COUNT(*) from sqlite_master WHERE TYPE='table' AND NAME='contacts'"},
     {kDrop, kContacts, {}, {}, "DROP TABLE contacts"},
-    {kCreate, kContacts, {}, {{"name", "TEXT"}, {"phone", "TEXT"}},
+    {kCreate, kContacts, kNoKeys, {{"name", "TEXT"}, {"phone", "TEXT"}},
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, name TEXT, phone TEXT)"},
-    {kCreate, kContacts, {}, {}, "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY)"},
-    {kCreate, kContacts, {{"phone", "TEXT"}}, kNameText,
+    {kCreate, kContacts, kNoKeys, {}, "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY)"},
+    {kCreate, kContacts, {{"phone", "TEXT"}, {}}, kNameText,
      "CREATE TABLE IF NOT EXISTS contacts (phone TEXT NOT NULL PRIMARY KEY, name TEXT)"},
-    {kCreate, kContacts, {{"phone", "TEXT"}}, {}, "CREATE TABLE IF NOT EXISTS contacts (phone TEXT NOT NULL PRIMARY KEY)"},
+    {kCreate, kContacts, {{"phone", "TEXT"}, {}}, {},
+     "CREATE TABLE IF NOT EXISTS contacts (phone TEXT NOT NULL PRIMARY KEY)"},
     {kCreate, kContacts, {{"owner", "TEXT"}, {"phone", "TEXT"}}, kNameText,
      "CREATE TABLE IF NOT EXISTS contacts (owner TEXT, phone TEXT, name TEXT, PRIMARY KEY(owner, phone))"},
     {kCreate, kContacts, {{"owner", "TEXT"}, {"phone", "TEXT"}}, {},
      "CREATE TABLE IF NOT EXISTS contacts (owner TEXT, phone TEXT, PRIMARY KEY(owner, phone))"},
-    {kCreate, kContacts, {{nullptr, nullptr}, {"phone", "TEXT"}}, kNameText,
+    {kCreate, kContacts, {{}, {"phone", "TEXT"}}, kNameText,
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, name TEXT)"},
-    {kCreate, kContacts, {}, {{"name", "TEXT"}, {"age", "INTEGER DEFAULT 0"}},
+    {kCreate, kContacts, kNoKeys, {{"name", "TEXT"}, {"age", "INTEGER DEFAULT 0"}},
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, name TEXT, age INTEGER DEFAULT 0)"},
-    {kCreate, kContacts, {{"phone", ""}}, kNameText,
+    {kCreate, kContacts, {{"phone", ""}, {}}, kNameText,
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, name TEXT)"},
-    {kCreate, kContacts, {}, {{"name", "TEXT"}, {"note", ""}},
+    {kCreate, kContacts, kNoKeys, {{"name", "TEXT"}, {"note", ""}},
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, name TEXT, note )"},
-    {kCreate, kContacts, {}, {{"phone", "TEXT"}, {"name", "TEXT"}},
+    {kCreate, kContacts, kNoKeys, {{"phone", "TEXT"}, {"name", "TEXT"}},
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, phone TEXT, name TEXT)"},
-    {kCreate, kContacts, {}, {{"price", "DECIMAL(10, 2)"}},
+    {kCreate, kContacts, kNoKeys, {{"price", "DECIMAL(10, 2)"}},
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, price DECIMAL(10, 2))"},
     {kSelect, kContacts, {}, {}, "SELECT * FROM contacts"},
     {kSelect, kContacts, {}, {{kName, "Kim"}}, "SELECT * FROM contacts WHERE name='Kim'"},
@@ -164,18 +171,18 @@ const SqlCase kCases[] = {
     {kUpdate, kContacts, {}, {{kPhone, "010"}}, "UPDATE contacts SET  WHERE phone='010'"},
     {kUpdate, kContacts, {{kName, ""}}, {{kPhone, "010"}}, "UPDATE contacts SET name = '' WHERE phone='010'"},
     {kDelete, kContacts, {}, {{kPhone, "010"}}, "DELETE  FROM contacts WHERE phone='010'"},
-    {kDelete, kContacts, {}, {{kPhone, "010"}, {kName, "Kim"}}, "DELETE  FROM contacts WHERE name='Kim' AND phone='010'"},
+    {kDelete, kContacts, {}, {{kPhone, "010"}, {kName, "Kim"}},
+     "DELETE  FROM contacts WHERE name='Kim' AND phone='010'"},
     {kDelete, kContacts, {}, {}, "DELETE  FROM contacts"},
     {kDelete, kContacts, {}, {{kName, "Kim AND Lee"}}, "DELETE  FROM contacts WHERE name='Kim AND Lee'"},
 };
+// clang-format on
 
 // The out-parameter starts with other text: the result must replace it.
 TEST(DASqlGenerator, StatementTextIsExactAndReplacesTheOutput)
 {
     for (const SqlCase& c : kCases) {
-        std::string out = "stale text that must disappear";
-        Generate(c, out);
-        EXPECT_EQ(out, c.expected);
+        EXPECT_EQ(Generated(c), c.expected);
     }
 }
 

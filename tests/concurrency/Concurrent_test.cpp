@@ -2,7 +2,6 @@
 // Update and Select on one database file at once: every insertion must land
 // exactly once with its own value, and every write must be in the file.
 
-#include <algorithm>
 #include <atomic>
 #include <functional>
 #include <string>
@@ -89,44 +88,9 @@ TEST(ConcurrentRequestFill, EveryInsertionLands)
     }
 }
 
-TEST(ConcurrentCursorFill, EveryColumnAndValueLands)
-{
-    // Columns "t0".."t3" get one value per call of their own thread;
-    // "t0+all" gets one from every call of every thread. It is the second
-    // column in name order, so the row count is the total of all values.
-    static const char all[] = "t0+all";
-    DACursor cursor;
-    cursor.SetColumn(all);
-    RunTogether([&](int t) {
-        const std::string own = "t" + std::to_string(t);
-        cursor.SetColumn(own.c_str());
-        for (int i = 0; i < kPerThread; ++i) {
-            const std::string value = own + ":" + std::to_string(i);
-            cursor.SetData(own.c_str(), value.c_str());
-            cursor.SetData(all, value.c_str());
-        }
-    });
-    ASSERT_EQ(cursor.GetCount(), kThreads * kPerThread);
-    Strings expectedAll;
-    for (int t = 0; t < kThreads; ++t) {
-        const std::string own = "t" + std::to_string(t);
-        for (int i = 0; i < kPerThread; ++i) {  // its own column reads back in call order
-            std::string value;
-            ASSERT_EQ(cursor.MoveToPosition(i), 0);
-            EXPECT_EQ(cursor.GetString(own.c_str(), value), 0);
-            expectedAll.push_back(own + ":" + std::to_string(i));
-            EXPECT_EQ(value, expectedAll.back());
-        }
-    }
-    Strings readAll = ColumnValues(cursor, all);
-    std::sort(readAll.begin(), readAll.end());
-    std::sort(expectedAll.begin(), expectedAll.end());
-    EXPECT_EQ(readAll, expectedAll);
-}
-
 // One thread loads while another empties the cursor again and again:
-// Initialize takes the lock loading takes, so names and stored columns
-// always agree, and every registered column holds its value.
+// Initialize, SetColumn and SetData take one lock, so names and stored
+// columns always agree, and every registered column holds its value.
 TEST(ConcurrentCursorFill, InitializeWhileAnotherThreadLoads)
 {
     const auto names = MakeNames("i");
@@ -164,7 +128,8 @@ TEST_F(ConcurrentDatabase, EverySucceededWriteIsInTheFile)
 {
     constexpr int kRows = 8;
     const std::string dir = Dir();
-    const auto at = [&dir](auto& request) -> auto& {
+    const auto at = [&dir](auto& request) -> auto&
+    {
         request.SetPath(dir.c_str(), "shared.db");
         request.SetTable("items");
         return request;

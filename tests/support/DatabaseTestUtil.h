@@ -84,32 +84,22 @@ public:
     // Runs sql and expects it to succeed.
     void Run(const std::string& sql)
     {
-        char* error = nullptr;
-        const int rc = sqlite3_exec(m_db, sql.c_str(), nullptr, nullptr, &error);
-        EXPECT_EQ(SQLITE_OK, rc) << sql << ": " << (error != nullptr ? error : "");
-        sqlite3_free(error);
+        EXPECT_EQ(SQLITE_OK, sqlite3_exec(m_db, sql.c_str(), nullptr, nullptr, nullptr))
+            << sql << ": " << sqlite3_errmsg(m_db);
     }
 
     // The rows of sql, columns joined by "|" and rows by ";", NULL as "NULL".
     std::string Query(const std::string& sql)
     {
+        char** cells = nullptr;
+        int rows = 0;
+        int columns = 0;
+        EXPECT_EQ(SQLITE_OK, sqlite3_get_table(m_db, sql.c_str(), &cells, &rows, &columns, nullptr)) << sql;
         std::string out;
-        char* error = nullptr;
-        const int rc = sqlite3_exec(
-            m_db, sql.c_str(),
-            [](void* user, int count, char** values, char**) {
-                auto* text = static_cast<std::string*>(user);
-                if (!text->empty()) {
-                    *text += ";";
-                }
-                for (int i = 0; i < count; ++i) {
-                    *text += (i > 0 ? "|" : "") + std::string(values[i] != nullptr ? values[i] : "NULL");
-                }
-                return 0;
-            },
-            &out, &error);
-        EXPECT_EQ(SQLITE_OK, rc) << sql << ": " << (error != nullptr ? error : "");
-        sqlite3_free(error);
+        for (int i = columns; i < (rows + 1) * columns; ++i) {
+            out += (i == columns ? "" : i % columns == 0 ? ";" : "|") + std::string(cells[i] ? cells[i] : "NULL");
+        }
+        sqlite3_free_table(cells);
         return out;
     }
 
