@@ -62,18 +62,6 @@ void Walk(DACursor& cursor, const std::vector<Step>& steps)
 
 }  // namespace
 
-TEST(DACursorNavigation, EmptyCursor)
-{
-    LogCapture log;
-    DACursor cursor;
-    Strings names{"kept"};
-    EXPECT_EQ(-1, cursor.GetCount());
-    EXPECT_EQ(1, cursor.GetColumn(names));
-    EXPECT_EQ(Strings{"kept"}, names);
-    Walk(cursor, {{kTo, 1, -1}, {kNext, 3, -2}, {kFirst, kVoid, -1}, {kPrev, 2, 0}, {kLast, kVoid, -1}});
-    EXPECT_EQ((Strings{kInvalid, kLastRow, kFirstRow}), Described(log));
-}
-
 TEST(DACursorNavigation, ThreeRowsThenInitialize)
 {
     LogCapture log;

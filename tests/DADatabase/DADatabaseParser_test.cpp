@@ -117,17 +117,6 @@ TEST_F(DADatabaseParserTest, ParseDatabaseStoresValuesAsSqliteText)
     EXPECT_EQ((Strings{"", "w"}), ColumnValues(m_cursor, "e"));
 }
 
-// A statement from the legacy preparation reports a failed step with the
-// generic text; the rows before it stay, and exactly one step follows it.
-TEST_F(DADatabaseParserTest, ParseDatabaseKeepsRowsReadBeforeAStepError)
-{
-    m_parser.ParseDatabase(m_db->Handle(), Prepare("SELECT v, fail_on(3, v * 10) AS w FROM t"), m_cursor);
-    EXPECT_EQ((Strings{Error("ParseDatabase", "SQLITE STEP ERROR!!! SQL logic error")}), Described(m_log));
-    EXPECT_EQ(4, m_calls);
-    EXPECT_EQ((Strings{"1", "2"}), ColumnValues(m_cursor, "v"));
-    EXPECT_EQ((Strings{"10", "20"}), ColumnValues(m_cursor, "w"));
-}
-
 // The statement is prepared first; then another connection takes the file
 // exclusively, so every step is busy.
 TEST_F(DADatabaseParserTest, BusyStepGivesUpAfterFifteenWaits)

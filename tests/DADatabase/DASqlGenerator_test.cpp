@@ -17,7 +17,8 @@ const char* const kTitle = kLow + 11;
 const char kHigh[] = "phone\0name";
 
 using Pairs = std::vector<std::pair<const char*, const char*>>;
-enum Kind { kPath, kCheck, kDrop, kCreate, kSelect, kJoin, kUpsert, kUpdate, kDelete };
+struct SqlCase;
+using Kind = std::string (*)(const SqlCase&);  // generates the statement of a case
 
 // One request and its statement. first holds the data (upsert, update), the
 // keys (create: primary, then composite), the join sides, or the path's
@@ -67,8 +68,9 @@ void Fill(DAJoinRequest& request, const SqlCase& c)
     }
 }
 
-template <typename Request>
-std::string Generated(void (DASqlGenerator::*generate)(Request&, std::string&), const SqlCase& c)
+// The statement of c's request: a fresh request filled from c.
+template <typename Request, void (DASqlGenerator::*generate)(Request&, std::string&)>
+std::string Generated(const SqlCase& c)
 {
     Request request;
     Fill(request, c);
@@ -77,34 +79,29 @@ std::string Generated(void (DASqlGenerator::*generate)(Request&, std::string&), 
     return out;
 }
 
-// The statement of c's request.
-std::string Generated(const SqlCase& c)
+std::string Path(const SqlCase& c)
 {
     std::string out = "stale text that must disappear";
-    switch (c.kind) {
-    case kPath:
-        DASqlGenerator().GetDBPath(c.first[0].first, c.first[0].second, out);
-        return out;
-    case kCheck:
-        DASqlGenerator().GetCheckTableSql(c.table, out);
-        return out;
-    case kDrop:
-        return Generated(&DASqlGenerator::GetDropTableSql, c);
-    case kCreate:
-        return Generated(&DASqlGenerator::GetCreateTableSql, c);
-    case kSelect:
-        return Generated(&DASqlGenerator::GetSelectSql, c);
-    case kJoin:
-        return Generated(&DASqlGenerator::GetJoinSql, c);
-    case kUpsert:
-        return Generated(&DASqlGenerator::GetUpsertSql, c);
-    case kUpdate:
-        return Generated(&DASqlGenerator::GetUpdateSql, c);
-    case kDelete:
-        return Generated(&DASqlGenerator::GetDeleteSql, c);
-    }
+    DASqlGenerator().GetDBPath(c.first[0].first, c.first[0].second, out);
     return out;
 }
+
+std::string Check(const SqlCase& c)
+{
+    std::string out = "stale text that must disappear";
+    DASqlGenerator().GetCheckTableSql(c.table, out);
+    return out;
+}
+
+const Kind kPath = Path;
+const Kind kCheck = Check;
+const Kind kDrop = Generated<DADropRequest, &DASqlGenerator::GetDropTableSql>;
+const Kind kCreate = Generated<DACreateRequest, &DASqlGenerator::GetCreateTableSql>;
+const Kind kSelect = Generated<DASelectRequest, &DASqlGenerator::GetSelectSql>;
+const Kind kJoin = Generated<DAJoinRequest, &DASqlGenerator::GetJoinSql>;
+const Kind kUpsert = Generated<DAUpsertRequest, &DASqlGenerator::GetUpsertSql>;
+const Kind kUpdate = Generated<DAUpdateRequest, &DASqlGenerator::GetUpdateSql>;
+const Kind kDelete = Generated<DADeleteRequest, &DASqlGenerator::GetDeleteSql>;
 
 const char* const kContacts = "contacts";
 const Pairs kNameText{{"name", "TEXT"}};
@@ -117,8 +114,6 @@ const SqlCase kCases[] = {
     {kPath, nullptr, {{"", "notes.db"}}, {}, "notes.db"},
     {kPath, nullptr, {{"/", "notes.db"}}, {}, "/notes.db"},
     {kPath, nullptr, {{"notes", "notes.db"}}, {}, "notes/notes.db"},
-    {kPath, nullptr, {{"/data//", "notes.db"}}, {}, "/data//notes.db"},
-    {kPath, nullptr, {{"/data/notes", ""}}, {}, "/data/notes/"},
     {kCheck, kContacts, {}, {}, "SELECT COUNT(*) from sqlite_master WHERE TYPE='table' AND NAME='contacts'"},
     {kDrop, kContacts, {}, {}, "DROP TABLE contacts"},
     {kCreate, kContacts, kNoKeys, {{"name", "TEXT"}, {"phone", "TEXT"}},
@@ -138,18 +133,14 @@ const SqlCase kCases[] = {
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, name TEXT, age INTEGER DEFAULT 0)"},
     {kCreate, kContacts, {{"phone", ""}, {}}, kNameText,
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, name TEXT)"},
-    {kCreate, kContacts, kNoKeys, {{"name", "TEXT"}, {"note", ""}},
-     "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, name TEXT, note )"},
     {kCreate, kContacts, kNoKeys, {{"phone", "TEXT"}, {"name", "TEXT"}},
      "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, phone TEXT, name TEXT)"},
-    {kCreate, kContacts, kNoKeys, {{"price", "DECIMAL(10, 2)"}},
-     "CREATE TABLE IF NOT EXISTS contacts (_ID INTEGER PRIMARY KEY, price DECIMAL(10, 2))"},
     {kSelect, kContacts, {}, {}, "SELECT * FROM contacts"},
     {kSelect, kContacts, {}, {{kName, "Kim"}}, "SELECT * FROM contacts WHERE name='Kim'"},
     {kSelect, kContacts, {}, {{kPhone, "010"}, {kName, "Kim"}},
      "SELECT * FROM contacts WHERE name='Kim' AND phone='010'"},
+    // The one cut every list shares removes only the last separator.
     {kSelect, kContacts, {}, {{kName, "Kim AND Lee"}}, "SELECT * FROM contacts WHERE name='Kim AND Lee'"},
-    {kSelect, kContacts, {}, {{kName, ""}}, "SELECT * FROM contacts WHERE name=''"},
     {kJoin, nullptr, {{"contacts", "group_id"}, {"groups", "id"}}, {},
      "SELECT  * FROM contacts INNER JOIN groups ON contacts.group_id = groups.id"},
     {kJoin, nullptr, {{"contacts", "group_id"}, {"groups", "id"}}, {{kTitle, "Family"}},
@@ -157,24 +148,18 @@ const SqlCase kCases[] = {
     {kUpsert, kContacts, {{kPhone, "010"}, {kName, "Kim"}}, {},
      "INSERT OR REPLACE INTO contacts (name, phone) VALUES ('Kim', '010')"},
     {kUpsert, kContacts, {{kName, "Kim"}}, {}, "INSERT OR REPLACE INTO contacts (name) VALUES ('Kim')"},
-    {kUpsert, kContacts, {{kName, "Kim, Lee"}}, {}, "INSERT OR REPLACE INTO contacts (name) VALUES ('Kim, Lee')"},
     {kUpsert, kContacts, {{kHigh + 6, "Kim"}, {kHigh, "010"}}, {},
      "INSERT OR REPLACE INTO contacts (phone, name) VALUES ('010', 'Kim')"},
     // The one quoting rule every literal shares: a quote is doubled.
     {kUpsert, kContacts, {{kName, "Kim's"}, {kPhone, "'"}}, {},
      "INSERT OR REPLACE INTO contacts (name, phone) VALUES ('Kim''s', '''')"},
-    {kUpsert, kContacts, {}, {}, "INSERT OR REPLACE INTO contacts () VALUES ()"},
     {kUpdate, kContacts, {{kName, "Lee"}}, {{kPhone, "010"}}, "UPDATE contacts SET name = 'Lee' WHERE phone='010'"},
     {kUpdate, kContacts, {{kPhone, "011"}, {kName, "Lee"}}, {{kPhone, "010"}, {kName, "Kim"}},
      "UPDATE contacts SET name = 'Lee', phone = '011' WHERE name='Kim' AND phone='010'"},
-    {kUpdate, kContacts, {{kName, "Lee"}}, {}, "UPDATE contacts SET name = 'Lee' WHERE "},
-    {kUpdate, kContacts, {}, {{kPhone, "010"}}, "UPDATE contacts SET  WHERE phone='010'"},
-    {kUpdate, kContacts, {{kName, ""}}, {{kPhone, "010"}}, "UPDATE contacts SET name = '' WHERE phone='010'"},
     {kDelete, kContacts, {}, {{kPhone, "010"}}, "DELETE  FROM contacts WHERE phone='010'"},
     {kDelete, kContacts, {}, {{kPhone, "010"}, {kName, "Kim"}},
      "DELETE  FROM contacts WHERE name='Kim' AND phone='010'"},
     {kDelete, kContacts, {}, {}, "DELETE  FROM contacts"},
-    {kDelete, kContacts, {}, {{kName, "Kim AND Lee"}}, "DELETE  FROM contacts WHERE name='Kim AND Lee'"},
 };
 // clang-format on
 
@@ -182,7 +167,7 @@ const SqlCase kCases[] = {
 TEST(DASqlGenerator, StatementTextIsExactAndReplacesTheOutput)
 {
     for (const SqlCase& c : kCases) {
-        EXPECT_EQ(Generated(c), c.expected);
+        EXPECT_EQ(c.kind(c), c.expected);
     }
 }
 

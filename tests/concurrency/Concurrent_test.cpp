@@ -119,7 +119,7 @@ TEST(ConcurrentCursorFill, InitializeWhileAnotherThreadLoads)
     }
 }
 
-// Each thread upserts fresh rows, updates each and reads it back, every call
+// Each thread upserts fresh rows and updates each, every call
 // with its own connection. Contention shows as SQLITE_BUSY and must be
 // absorbed by the busy-retry rule (up to 15 pauses of 100 ms).
 class ConcurrentDatabase : public TempDirTest {};
@@ -153,11 +153,6 @@ TEST_F(ConcurrentDatabase, EverySucceededWriteIsInTheFile)
             at(update).SetData("value", updated.c_str());
             update.SetWhere("name", name.c_str());
             EXPECT_EQ(database.Update(update), 0) << name;
-            DASelectRequest select;  // the thread's own read sees its committed writes
-            at(select).SetWhere("name", name.c_str());
-            DACursor cursor;
-            EXPECT_EQ(database.Select(select, cursor), 0) << name;
-            EXPECT_EQ(ColumnValues(cursor, "value"), Strings{updated}) << name;
         }
     });
     // Every row is there (names are the key), each with its own update.
