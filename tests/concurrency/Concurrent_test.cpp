@@ -1,5 +1,5 @@
-// Several threads fill one request or one cursor at once, or run Upsert,
-// Update and Select on one database file at once: every insertion must land
+// Several threads fill one request or one cursor at once, or run Upsert and
+// Update on one database file at once: every insertion must land
 // exactly once with its own value, and every write must be in the file.
 
 #include <atomic>
