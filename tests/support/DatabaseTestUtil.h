@@ -5,8 +5,8 @@
 // raw SQLite connection for seeding and checking files, and the
 // open-descriptor count of the process.
 
-#include <dirent.h>
-
+#include <filesystem>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -59,16 +59,10 @@ inline Strings ColumnValues(DACursor& cursor, const char* column)
     return values;
 }
 
+// The descriptors the process has open.
 inline int OpenDescriptorCount()
 {
-    int count = 0;
-    if (DIR* dir = opendir("/proc/self/fd")) {
-        while (readdir(dir) != nullptr) {
-            ++count;
-        }
-        closedir(dir);
-    }
-    return count;
+    return static_cast<int>(std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {}));
 }
 
 // A plain connection to a database file, independent of the library.

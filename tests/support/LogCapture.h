@@ -1,6 +1,7 @@
 #ifndef ULO_TESTS_LOGCAPTURE_H
 #define ULO_TESTS_LOGCAPTURE_H
 
+#include <algorithm>
 #include <mutex>
 #include <regex>
 #include <string>
@@ -35,11 +36,9 @@ public:
     // How many lines carry exactly this message.
     int Count(const std::string& message) const
     {
-        int count = 0;
-        for (const LogLine& line : Lines()) {
-            count += line.message == message ? 1 : 0;
-        }
-        return count;
+        const std::vector<LogLine> lines = Lines();
+        return static_cast<int>(
+            std::count_if(lines.begin(), lines.end(), [&](const LogLine& line) { return line.message == message; }));
     }
 
     void Clear()

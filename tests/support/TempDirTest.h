@@ -1,11 +1,8 @@
 #ifndef ULO_TESTS_TEMPDIRTEST_H
 #define ULO_TESTS_TEMPDIRTEST_H
 
-#include <ftw.h>
-#include <sys/stat.h>
-
-#include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -26,9 +23,8 @@ protected:
     void TearDown() override
     {
         if (!m_dir.empty()) {
-            nftw(
-                m_dir.c_str(), [](const char* path, const struct stat*, int, struct FTW*) { return std::remove(path); },
-                16, FTW_DEPTH | FTW_PHYS);
+            std::error_code ignored;
+            std::filesystem::remove_all(m_dir, ignored);
         }
     }
 
@@ -36,11 +32,7 @@ protected:
     const std::string& Dir() const { return m_dir; }
     // Dir() + "/" + name.
     std::string PathOf(const std::string& name) const { return m_dir + "/" + name; }
-    bool FileExists(const std::string& name) const
-    {
-        struct stat info {};
-        return stat(PathOf(name).c_str(), &info) == 0;
-    }
+    bool FileExists(const std::string& name) const { return std::filesystem::exists(PathOf(name)); }
 
 private:
     std::string m_dir;
