@@ -88,20 +88,50 @@ TEST(ConcurrentRequestFill, EveryInsertionLands)
     }
 }
 
-// One thread loads while another empties the cursor again and again:
-// Initialize, SetColumn and SetData take one lock, so names and stored
-// columns always agree, and every registered column holds its value.
-TEST(ConcurrentCursorFill, InitializeWhileAnotherThreadLoads)
+// Every registered column holds a value at row 0.
+void ExpectEveryColumnHoldsAValue(DACursor& cursor)
+{
+    const LogCapture quiet;  // an emptied cursor logs its invalid position
+    Strings registered;
+    EXPECT_EQ(cursor.GetColumn(registered), cursor.MoveToPosition(0));  // 0 with columns, 1 without
+    for (const std::string& name : registered) {
+        std::string value;
+        EXPECT_EQ(cursor.GetString(name.c_str(), value), 0) << name;
+    }
+}
+
+// Threads register columns and store values at once, each value also in one
+// shared column (the second in name order, so the count is its length).
+// Then one thread loads while another empties the cursor again and again.
+// SetColumn, SetData and Initialize take one lock: every value lands, and
+// names and stored columns always agree.
+TEST(ConcurrentCursorFill, EveryValueLandsAndInitializeEmptiesWhole)
 {
     const auto names = MakeNames("i");
+    const char* const shared = names[0][1].c_str();
+    const auto load = [&](DACursor& cursor, int t) {
+        for (const std::string& name : names[t % kThreads]) {
+            cursor.SetColumn(name.c_str());
+            cursor.SetData(name.c_str(), "v");
+            cursor.SetData(shared, "v");
+        }
+    };
+    for (int round = 0; round < 10; ++round) {
+        DACursor cursor;
+        cursor.SetColumn(shared);
+        RunTogether([&](int t) { load(cursor, t); });
+        ASSERT_EQ(cursor.GetCount(), kThreads * kPerThread + 1);
+        Strings registered;
+        ASSERT_EQ(cursor.GetColumn(registered), 0);
+        ASSERT_EQ(registered.size(), static_cast<size_t>(kThreads * kPerThread + 1));
+        ExpectEveryColumnHoldsAValue(cursor);
+    }
     DACursor cursor;
+
     std::atomic<bool> loaded{false};
     std::thread loader([&] {
         for (int round = 0; round < 1000; ++round) {
-            for (const std::string& name : names[round % kThreads]) {
-                cursor.SetColumn(name.c_str());
-                cursor.SetData(name.c_str(), "v");
-            }
+            load(cursor, round);
         }
         loaded = true;
     });
@@ -109,14 +139,7 @@ TEST(ConcurrentCursorFill, InitializeWhileAnotherThreadLoads)
         cursor.Initialize();
     }
     loader.join();
-    Strings registered;
-    const bool any = cursor.GetColumn(registered) == 0;
-    EXPECT_EQ(any ? 0 : 1, cursor.MoveToPosition(0));
-    for (const std::string& name : registered) {
-        std::string value;
-        EXPECT_EQ(cursor.GetString(name.c_str(), value), 0) << name;
-        EXPECT_EQ(value, "v") << name;
-    }
+    ExpectEveryColumnHoldsAValue(cursor);
 }
 
 // Each thread upserts fresh rows and updates each, every call
