@@ -3,14 +3,11 @@
 #include <chrono>
 #include <memory>
 #include <string>
-#include <vector>
 
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 
-#include "DACursor.h"
 #include "DatabaseTestUtil.h"
-#include "LogCapture.h"
 #include "TempDirTest.h"
 
 namespace {
@@ -21,10 +18,14 @@ void FailOn(sqlite3_context* context, int /*argc*/, sqlite3_value** argv)
 {
     int* calls = static_cast<int*>(sqlite3_user_data(context));
     if (++*calls == sqlite3_value_int(argv[0])) {
-        sqlite3_result_error(context, "third row refused", -1);
-        return;
+        return sqlite3_result_error(context, "third row refused", -1);
     }
     sqlite3_result_value(context, argv[1]);
+}
+
+std::string Error(const std::string& function, const std::string& message)
+{
+    return Logged(6, "DADatabasePasrser.cpp", function, message);
 }
 
 class DADatabaseParserTest : public TempDirTest {
@@ -32,11 +33,9 @@ protected:
     void SetUp() override
     {
         TempDirTest::SetUp();
-        m_db.reset(new RawDb(PathOf("parse.db")));
+        m_db = std::make_unique<RawDb>(PathOf("parse.db"));
         m_db->Run("CREATE TABLE t(v INTEGER); INSERT INTO t VALUES (1), (2), (3), (4), (5);");
-        ASSERT_EQ(
-            SQLITE_OK,
-            sqlite3_create_function(m_db->Handle(), "fail_on", 2, SQLITE_UTF8, &m_calls, FailOn, nullptr, nullptr));
+        sqlite3_create_function(m_db->Handle(), "fail_on", 2, SQLITE_UTF8, &m_calls, FailOn, nullptr, nullptr);
     }
     void TearDown() override
     {
@@ -50,119 +49,72 @@ protected:
     {
         sqlite3_finalize(m_stmt);
         m_stmt = nullptr;
-        EXPECT_EQ(SQLITE_OK, sqlite3_prepare(m_db->Handle(), sql.c_str(), -1, &m_stmt, nullptr))
-            << sqlite3_errmsg(m_db->Handle());
+        EXPECT_EQ(SQLITE_OK, sqlite3_prepare(m_db->Handle(), sql.c_str(), -1, &m_stmt, nullptr));
         return m_stmt;
     }
 
     std::unique_ptr<RawDb> m_db;
     sqlite3_stmt* m_stmt = nullptr;
     int m_calls = 0;
+    LogCapture m_log;
+    DADatabaseParser m_parser;
+    DACursor m_cursor;
 };
-
-const std::string kParser = "DADatabasePasrser.cpp";
-
-std::string Error(const std::string& function, const std::string& message)
-{
-    return "6 " + kParser + ":" + function + " > " + message;
-}
 
 }  // namespace
 
+// Any row with a positive count sets the answer; later rows never clear it.
 TEST_F(DADatabaseParserTest, ParseExistTableReadsTheCount)
 {
-    struct Case {
-        const char* sql;
-        bool exists;
-    };
-    const Case cases[] = {
-        {"SELECT 0", false},
-        {"SELECT 1", true},
-        {"SELECT 7", true},
-        {"SELECT -1", false},
-        {"SELECT 1 WHERE 0", false},  // no row
-        {"SELECT v - 1 FROM t", true},  // 0 first, then positive
-        {"SELECT 2 - v FROM t", true},  // positive first, then 0 and below: stays true
-        {"SELECT COUNT(*) FROM sqlite_master WHERE name = 't'", true},
-    };
-    for (const Case& c : cases) {
-        LogCapture log;
-        DADatabaseParser parser;
-        bool exists = !c.exists;
-        EXPECT_EQ(SQLITE_DONE, parser.ParseExistTable(Prepare(c.sql), exists)) << c.sql;
-        EXPECT_EQ(c.exists, exists) << c.sql;
-        EXPECT_TRUE(log.Lines().empty()) << c.sql;
+    const std::pair<const char*, bool> cases[] = {{"SELECT 0", false},           {"SELECT 1", true},
+                                                  {"SELECT -1", false},          {"SELECT 1 WHERE 0", false},
+                                                  {"SELECT v - 1 FROM t", true}, {"SELECT 2 - v FROM t", true}};
+    for (const auto& c : cases) {
+        bool exists = !c.second;
+        EXPECT_EQ(SQLITE_DONE, m_parser.ParseExistTable(Prepare(c.first), exists)) << c.first;
+        EXPECT_EQ(c.second, exists) << c.first;
     }
+    EXPECT_TRUE(m_log.Lines().empty());
 }
 
+// Rows 1 and 2, the error on the third, then one step that restarts the
+// statement and yields its first row again, unread. A step result with no
+// branch of its own (misuse, from a null statement) ends the loop the same way.
 TEST_F(DADatabaseParserTest, ParseExistTableStepsOnceMoreAfterAnError)
 {
-    LogCapture log;
-    DADatabaseParser parser;
-    bool exists = false;
-    const int rc = parser.ParseExistTable(Prepare("SELECT fail_on(3, v) FROM t"), exists);
-    // Rows 1 and 2, the error on the third, then one step that restarts the
-    // statement and yields its first row again, unread.
-    EXPECT_EQ(SQLITE_ROW, rc);
+    bool exists = true;
+    EXPECT_EQ(SQLITE_MISUSE, m_parser.ParseExistTable(nullptr, exists));
+    EXPECT_FALSE(exists);
+    m_parser.ParseDatabase(m_db->Handle(), nullptr, m_cursor);
+    EXPECT_EQ(-1, m_cursor.GetCount());
+    EXPECT_EQ(SQLITE_ROW, m_parser.ParseExistTable(Prepare("SELECT fail_on(3, v) FROM t"), exists));
     EXPECT_EQ(4, m_calls);
     EXPECT_TRUE(exists);
-    EXPECT_EQ((Strings{Error("ParseExistTable", "SQLITE STEP ERROR!!!")}), Described(log));
+    EXPECT_EQ((Strings{Error("ParseExistTable", "SQLITE STEP ERROR!!!"),
+                       Error("ParseDatabase", "SQLITE STEP ERROR!!! not an error"),
+                       Error("ParseExistTable", "SQLITE STEP ERROR!!!")}),
+              Described(m_log));
 }
 
 TEST_F(DADatabaseParserTest, ParseDatabaseStoresValuesAsSqliteText)
 {
-    LogCapture log;
-    DACursor cursor;
-    DADatabaseParser parser;
-    parser.ParseDatabase(m_db->Handle(),
-                         Prepare("SELECT 42 AS i, 2.5 AS r, NULL AS n, x'0102' AS b, 'txt' AS t, "
-                                 "'' AS e, 1 AS i UNION ALL SELECT -3, 1e20, 'x', 'y', 'z', 'w', 2"),
-                         cursor);
+    m_parser.ParseDatabase(m_db->Handle(),
+                           Prepare("SELECT 42 AS i, 2.5 AS r, NULL AS n, x'0102' AS b, 'txt' AS t, "
+                                   "'' AS e, 1 AS i UNION ALL SELECT -3, 1e20, 'x', 'y', 'z', 'w', 2"),
+                           m_cursor);
     Strings names;
-    EXPECT_EQ(0, cursor.GetColumn(names));
+    EXPECT_EQ(0, m_cursor.GetColumn(names));
     EXPECT_EQ((Strings{"i", "r", "n", "b", "t", "e", "i"}), names);
-    EXPECT_EQ(-1, cursor.GetPosition());
-    EXPECT_EQ((Strings{Error("ParseDatabase", "UNKNOWN TYPE")}), Described(log));
+    EXPECT_EQ(-1, m_cursor.GetPosition());
+    EXPECT_EQ((Strings{Error("ParseDatabase", "UNKNOWN TYPE")}), Described(m_log));
     // i's one list holds 42, 1, -3, 2; the count (2) comes from e, so rows read 42, 1.
-    EXPECT_EQ(2, cursor.GetCount());
-    EXPECT_EQ((Strings{"42", "1"}), ColumnValues(cursor, "i"));
-    EXPECT_EQ((Strings{"", "x"}), ColumnValues(cursor, "n"));
-    EXPECT_EQ((Strings{"", "y"}), ColumnValues(cursor, "b"));
-    EXPECT_EQ((Strings{"2.5", "1.0e+20"}), ColumnValues(cursor, "r"));
-    EXPECT_EQ((Strings{"txt", "z"}), ColumnValues(cursor, "t"));
-    EXPECT_EQ((Strings{"", "w"}), ColumnValues(cursor, "e"));
-}
-
-TEST_F(DADatabaseParserTest, ParseDatabaseKeepsRowsReadBeforeAStepError)
-{
-    LogCapture log;
-    DACursor cursor;
-    DADatabaseParser parser;
-    parser.ParseDatabase(m_db->Handle(), Prepare("SELECT v, fail_on(3, v * 10) AS w FROM t"), cursor);
-    // A statement from the legacy preparation reports a failed step with the
-    // generic text; the function's own message comes only with a reset.
-    EXPECT_EQ((Strings{Error("ParseDatabase", "SQLITE STEP ERROR!!! SQL logic error")}), Described(log));
-    EXPECT_EQ(4, m_calls);  // exactly one step after the error
-    EXPECT_EQ(2, cursor.GetCount());
-    EXPECT_EQ((Strings{"1", "2"}), ColumnValues(cursor, "v"));
-    EXPECT_EQ((Strings{"10", "20"}), ColumnValues(cursor, "w"));
-}
-
-// A step result with no branch of its own (misuse, from a null statement) is
-// handled like a step error: one line, one more step, and the loop ends.
-TEST_F(DADatabaseParserTest, UnexpectedStepResultEndsTheLoop)
-{
-    LogCapture log;
-    DADatabaseParser parser;
-    bool exists = true;
-    EXPECT_EQ(SQLITE_MISUSE, parser.ParseExistTable(nullptr, exists));
-    EXPECT_FALSE(exists);
-    DACursor cursor;
-    parser.ParseDatabase(m_db->Handle(), nullptr, cursor);
-    EXPECT_EQ(-1, cursor.GetCount());
-    EXPECT_EQ((Strings{Error("ParseExistTable", "SQLITE STEP ERROR!!!"),
-                       Error("ParseDatabase", "SQLITE STEP ERROR!!! not an error")}),
-              Described(log));
+    EXPECT_EQ(2, m_cursor.GetCount());
+    EXPECT_EQ((Strings{"42", "1"}), ColumnValues(m_cursor, "i"));
+    EXPECT_EQ((Strings{"", "x"}), ColumnValues(m_cursor, "n"));
+    EXPECT_EQ((Strings{"", "y"}), ColumnValues(m_cursor, "b"));
+    EXPECT_EQ((Strings{"2.5", "1.0e+20"}), ColumnValues(m_cursor, "r"));
+    EXPECT_EQ((Strings{"txt", "z"}), ColumnValues(m_cursor, "t"));
+    EXPECT_EQ((Strings{"", "w"}), ColumnValues(m_cursor, "e"));
 }
 
 // The statement is prepared first; then another connection takes the file
@@ -172,17 +124,14 @@ TEST_F(DADatabaseParserTest, BusyStepGivesUpAfterFifteenWaits)
     sqlite3_stmt* stmt = Prepare("SELECT v FROM t");
     RawDb holder(PathOf("parse.db"));
     holder.Run("BEGIN EXCLUSIVE");
-    LogCapture log;
-    DACursor cursor;
     const auto start = std::chrono::steady_clock::now();
-    DADatabaseParser().ParseDatabase(m_db->Handle(), stmt, cursor);
+    m_parser.ParseDatabase(m_db->Handle(), stmt, m_cursor);
     const double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
     holder.Run("COMMIT");
-
-    Strings expected = BusyWarnings(kParser, 15);
+    Strings expected = BusyWarnings("DADatabasePasrser.cpp", 15);
     expected.push_back(Error("IsRetryLimit", "RETRY COUNT is reached LIMIT, SQLITE_BUSY"));
-    EXPECT_EQ(expected, Described(log));
-    EXPECT_EQ(-1, cursor.GetCount());
+    EXPECT_EQ(expected, Described(m_log));
+    EXPECT_EQ(-1, m_cursor.GetCount());
     EXPECT_GE(seconds, 1.4);
     EXPECT_LT(seconds, 10.0);
 }

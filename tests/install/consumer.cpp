@@ -35,22 +35,22 @@ int main(int argc, char** argv)
     mutex.Lock();
     mutex.Unlock();
 
+    const auto at = [dir](auto& request) -> auto&
+    {
+        request.SetPath(dir, "consumer.db");
+        request.SetTable("items");
+        return request;
+    };
     DACreateRequest create;
-    create.SetPath(dir, "consumer.db");
-    create.SetTable("items");
-    create.SetColumnKey("label", "TEXT");
+    at(create).SetColumnKey("label", "TEXT");
     DAUpsertRequest upsert;
-    upsert.SetPath(dir, "consumer.db");
-    upsert.SetTable("items");
-    upsert.SetData("label", "installed");
+    at(upsert).SetData("label", "installed");
     DASelectRequest select;
-    select.SetPath(dir, "consumer.db");
-    select.SetTable("items");
 
     DADatabase db;
     DACursor cursor;
     std::string label;
-    if (db.CreateTable(create) != 0 || db.Upsert(upsert) != 0 || db.Select(select, cursor) != 0 ||
+    if (db.CreateTable(create) != 0 || db.Upsert(upsert) != 0 || db.Select(at(select), cursor) != 0 ||
         cursor.MoveToNext() != 0 || cursor.GetString("label", label) != 0 || label != "installed") {
         std::fprintf(stderr, "consumer: round trip failed\n");
         return 1;

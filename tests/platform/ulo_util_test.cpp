@@ -7,7 +7,6 @@
 
 #include <gtest/gtest.h>
 
-#include "DALogger.h"
 #include "DAMutex.h"
 
 namespace {
@@ -52,14 +51,6 @@ TEST(DAMutex, UnlockWithoutLockIsHarmlessAndDestructionReleases)
     holder->Lock();
     idle.Unlock();
     ExpectBlockedUntil("beef2", [&holder] { holder.reset(); });
-}
-
-TEST(DALogger, OneInstanceWithTheLibraryTag)
-{
-    DALogger* const logger = DALogger::GetInstance();
-    ASSERT_NE(logger, nullptr);
-    EXPECT_STREQ(logger->GetLogTag(), "ULO_DB");
-    EXPECT_EQ(std::async(std::launch::async, [] { return DALogger::GetInstance(); }).get(), logger);
 }
 
 }  // namespace

@@ -1,12 +1,12 @@
 #ifndef ULO_TESTS_DATABASETESTUTIL_H
 #define ULO_TESTS_DATABASETESTUTIL_H
 
-// Helpers shared by the tests that run on real database files: a raw
-// SQLite connection for seeding and checking files, a compact view of the
-// captured log lines, and the open-descriptor count of the process.
+// Helpers shared by the tests: a compact view of the captured log lines, a
+// raw SQLite connection for seeding and checking files, and the
+// open-descriptor count of the process.
 
-#include <dirent.h>
-
+#include <filesystem>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -18,13 +18,20 @@
 
 using Strings = std::vector<std::string>;
 
-// Every captured line as "priority file:function > message", so a whole log
-// can be compared at once with a readable difference.
+// One log line as Described shows it: "priority file:function > message".
+inline std::string Logged(int priority, const std::string& file, const std::string& function,
+                          const std::string& message)
+{
+    return std::to_string(priority) + " " + file + ":" + function + " > " + message;
+}
+
+// Every captured line as Logged shows it, so a whole log can be compared at
+// once with a readable difference.
 inline Strings Described(const LogCapture& log)
 {
     Strings out;
     for (const LogLine& line : log.Lines()) {
-        out.push_back(std::to_string(line.priority) + " " + line.file + ":" + line.function + " > " + line.message);
+        out.push_back(Logged(line.priority, line.file, line.function, line.message));
     }
     return out;
 }
@@ -34,7 +41,7 @@ inline Strings BusyWarnings(const std::string& file, int n)
 {
     Strings out;
     for (int i = 1; i <= n; ++i) {
-        out.push_back("5 " + file + ":IsRetryLimit > SQLITE BUSY[" + std::to_string(i) + "]");
+        out.push_back(Logged(5, file, "IsRetryLimit", "SQLITE BUSY[" + std::to_string(i) + "]"));
     }
     return out;
 }
@@ -52,16 +59,10 @@ inline Strings ColumnValues(DACursor& cursor, const char* column)
     return values;
 }
 
+// The descriptors the process has open.
 inline int OpenDescriptorCount()
 {
-    int count = 0;
-    if (DIR* dir = opendir("/proc/self/fd")) {
-        while (readdir(dir) != nullptr) {
-            ++count;
-        }
-        closedir(dir);
-    }
-    return count;
+    return static_cast<int>(std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {}));
 }
 
 // A plain connection to a database file, independent of the library.
@@ -77,32 +78,22 @@ public:
     // Runs sql and expects it to succeed.
     void Run(const std::string& sql)
     {
-        char* error = nullptr;
-        const int rc = sqlite3_exec(m_db, sql.c_str(), nullptr, nullptr, &error);
-        EXPECT_EQ(SQLITE_OK, rc) << sql << ": " << (error != nullptr ? error : "");
-        sqlite3_free(error);
+        EXPECT_EQ(SQLITE_OK, sqlite3_exec(m_db, sql.c_str(), nullptr, nullptr, nullptr))
+            << sql << ": " << sqlite3_errmsg(m_db);
     }
 
     // The rows of sql, columns joined by "|" and rows by ";", NULL as "NULL".
     std::string Query(const std::string& sql)
     {
+        char** cells = nullptr;
+        int rows = 0;
+        int columns = 0;
+        EXPECT_EQ(SQLITE_OK, sqlite3_get_table(m_db, sql.c_str(), &cells, &rows, &columns, nullptr)) << sql;
         std::string out;
-        char* error = nullptr;
-        const int rc = sqlite3_exec(
-            m_db, sql.c_str(),
-            [](void* user, int count, char** values, char**) {
-                auto* text = static_cast<std::string*>(user);
-                if (!text->empty()) {
-                    *text += ";";
-                }
-                for (int i = 0; i < count; ++i) {
-                    *text += (i > 0 ? "|" : "") + std::string(values[i] != nullptr ? values[i] : "NULL");
-                }
-                return 0;
-            },
-            &out, &error);
-        EXPECT_EQ(SQLITE_OK, rc) << sql << ": " << (error != nullptr ? error : "");
-        sqlite3_free(error);
+        for (int i = columns; i < (rows + 1) * columns; ++i) {
+            out += (i == columns ? "" : i % columns == 0 ? ";" : "|") + std::string(cells[i] ? cells[i] : "NULL");
+        }
+        sqlite3_free_table(cells);
         return out;
     }
 

@@ -1,40 +1,65 @@
 #ifndef ULO_TESTS_LOGCAPTURE_H
 #define ULO_TESTS_LOGCAPTURE_H
 
+#include <algorithm>
 #include <mutex>
+#include <regex>
 #include <string>
 #include <vector>
 
-// One line as the library wrote it, split into the fields of its
-// "file: function(line) > message" layout.
+#include "dlog.h"
+
+// One line as the library wrote it: "file: function(line) > message".
 struct LogLine {
-    int logId = 0;
     int priority = 0;
-    std::string tag;
-    std::string text;  // the whole formatted line
     std::string file;
     std::string function;
-    int line = 0;
-    std::string message;  // what follows "> "
+    std::string message;  // what follows "> "; the whole text for a line of another shape
 };
 
 // Collects every line written through __dlog_print while it lives (it
-// installs itself as the log sink and restores the default on
-// destruction). Safe to use while other threads log.
+// installs itself as the log sink and restores the default on destruction).
+// Safe to use while other threads log.
 class LogCapture {
 public:
-    LogCapture();
-    ~LogCapture();
+    LogCapture() { dlog_set_sink(&LogCapture::Sink, this); }
+    ~LogCapture() { dlog_set_sink(nullptr, nullptr); }
     LogCapture(const LogCapture&) = delete;
     LogCapture& operator=(const LogCapture&) = delete;
 
-    std::vector<LogLine> Lines() const;
+    std::vector<LogLine> Lines() const
+    {
+        const std::lock_guard<std::mutex> guard(m_mutex);
+        return m_lines;
+    }
+
     // How many lines carry exactly this message.
-    int Count(const std::string& message) const;
-    void Clear();
+    int Count(const std::string& message) const
+    {
+        const std::vector<LogLine> lines = Lines();
+        return static_cast<int>(
+            std::count_if(lines.begin(), lines.end(), [&](const LogLine& line) { return line.message == message; }));
+    }
+
+    void Clear()
+    {
+        const std::lock_guard<std::mutex> guard(m_mutex);
+        m_lines.clear();
+    }
 
 private:
-    static void Sink(int logId, int prio, const char* tag, const char* text, void* user);
+    static void Sink(int /*logId*/, int prio, const char* /*tag*/, const char* text, void* user)
+    {
+        static const std::regex layout(R"(([^:]*): ([^(]*)\(\d+\) > ([\s\S]*))");
+        std::cmatch fields;
+        LogLine line{prio, "", "", text};
+        if (std::regex_match(text, fields, layout)) {
+            line = {prio, fields[1], fields[2], fields[3]};
+        }
+        auto* self = static_cast<LogCapture*>(user);
+        const std::lock_guard<std::mutex> guard(self->m_mutex);
+        self->m_lines.push_back(std::move(line));
+    }
 
     mutable std::mutex m_mutex;
     std::vector<LogLine> m_lines;

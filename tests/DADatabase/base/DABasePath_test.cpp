@@ -6,42 +6,28 @@
 
 #include <gtest/gtest.h>
 
-namespace {
-
-TEST(DABasePath, GetPathYieldsCopiesMadeAtTheCall)
+// The parts are copied at the call. An unset directory throws before either
+// output is touched; an unset file name throws after the directory was
+// assigned; a null part unsets whatever it held.
+TEST(DABasePath, GetPathYieldsCopiesOrThrowsForAnUnsetPart)
 {
     char dir[] = "/data/notes";
     char file[] = "notes.db";
     DABasePath path;
+    std::string outDir = "old dir";
+    std::string outFile = "old file";
+    EXPECT_THROW(path.GetPath(outDir, outFile), std::logic_error);
     path.SetPath("/old", "old.db");
     path.SetPath(dir, file);
     std::strcpy(dir, "/xxxx/xxxxx");
     std::strcpy(file, "yyyyy.yy");
-
-    std::string outDir;
-    std::string outFile;
     path.GetPath(outDir, outFile);
     EXPECT_EQ(outDir + "|" + outFile, "/data/notes|notes.db");
-    path.SetPath("", "");
-    path.GetPath(outDir, outFile);
-    EXPECT_EQ(outDir + "|" + outFile, "|");
+    path.SetPath(nullptr, "b.db");
+    outDir = "old dir";
+    EXPECT_THROW(path.GetPath(outDir, outFile), std::logic_error);
+    EXPECT_EQ(outDir + "|" + outFile, "old dir|notes.db");
+    path.SetPath("", nullptr);
+    EXPECT_THROW(path.GetPath(outDir, outFile), std::logic_error);
+    EXPECT_EQ(outDir + "|" + outFile, "|notes.db");
 }
-
-// An unset directory throws before either output is touched; an unset file
-// name throws after the directory was assigned.
-TEST(DABasePath, UnsetPartThrows)
-{
-    DABasePath path;
-    std::string dir = "old dir";
-    std::string file = "old file";
-    EXPECT_THROW(path.GetPath(dir, file), std::logic_error);
-    path.SetPath("/data", "a.db");
-    path.SetPath(nullptr, "b.db");  // a null part is unset, whatever it held
-    EXPECT_THROW(path.GetPath(dir, file), std::logic_error);
-    EXPECT_EQ(dir + "|" + file, "old dir|old file");
-    path.SetPath("/other", nullptr);
-    EXPECT_THROW(path.GetPath(dir, file), std::logic_error);
-    EXPECT_EQ(dir + "|" + file, "/other|old file");
-}
-
-}  // namespace

@@ -1,12 +1,9 @@
 #include <cstring>
 #include <stdexcept>
 #include <string>
-#include <type_traits>
 
 #include <gtest/gtest.h>
 
-#include "DABasePath.h"
-#include "DABaseSet.h"
 #include "DACreateRequest.h"
 #include "DADeleteRequest.h"
 #include "DADropRequest.h"
@@ -15,17 +12,8 @@
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 #include "DatabaseTestUtil.h"
-#include "LogCapture.h"
 
 namespace {
-
-template <typename T>
-constexpr bool kNotCopyable = !std::is_copy_constructible<T>::value && !std::is_copy_assignable<T>::value;
-
-static_assert(kNotCopyable<DABasePath> && kNotCopyable<DABaseSet> && kNotCopyable<DASelectRequest> &&
-                  kNotCopyable<DAUpsertRequest> && kNotCopyable<DAUpdateRequest> && kNotCopyable<DADeleteRequest> &&
-                  kNotCopyable<DADropRequest> && kNotCopyable<DACreateRequest> && kNotCopyable<DAJoinRequest>,
-              "requests own raw copies of their names and must not be copied");
 
 // Every request class that names a table follows one SetTable/GetTable rule:
 // an unset name leaves the output alone, the name is copied at the call, a
@@ -45,16 +33,12 @@ TYPED_TEST(TableName, CopiedAtTheCallKeptOnNullReplacedOtherwise)
     request.SetTable(nullptr);
     request.GetTable(table);
     EXPECT_EQ(table, "caller's text");
-
-    char* buffer = new char[16];
-    std::strcpy(buffer, "contacts");
+    char buffer[] = "contacts";
     request.SetTable(buffer);
     std::strcpy(buffer, "XXXXXXXX");
-    delete[] buffer;
     request.SetTable(nullptr);
     request.GetTable(table);
     EXPECT_EQ(table, "contacts");
-
     request.SetTable("");
     request.GetTable(table);
     EXPECT_EQ(table, "");
@@ -89,37 +73,25 @@ TEST(PairGetters, ReadOnlyTheirOwnPairOnceBothPartsAreSet)
     ExpectPairRule(&DAJoinRequest::SetRightJoin, &DAJoinRequest::GetRightJoin, &DAJoinRequest::GetLeftJoin);
 }
 
-DAColumnList ColumnsOf(DACreateRequest& request)
-{
-    DAColumnList columns{{"stale", "TEXT"}};  // the getter must replace this
-    request.GetColumnKey(columns);
-    return columns;
-}
-
-TEST(DACreateRequest, ColumnsKeepCallOrderAndDuplicates)
+// Columns keep call order and duplicates (pairs compare the name pointers);
+// a null name is refused with a line, a null type throws and releases the
+// lock, and the getter replaces what its output held.
+TEST(DACreateRequest, ColumnsKeepCallOrderNullsAreRefused)
 {
     static const char x[] = "x";
     static const char y[] = "y";
     DACreateRequest request;
-    EXPECT_TRUE(ColumnsOf(request).empty());
-    request.SetColumnKey(x, "TEXT");
-    request.SetColumnKey(y, "INTEGER");
-    request.SetColumnKey(x, "");
-    // Pairs compare the name pointers, so both x entries hold x itself.
-    EXPECT_EQ(ColumnsOf(request), (DAColumnList{{x, "TEXT"}, {y, "INTEGER"}, {x, ""}}));
-}
-
-TEST(DACreateRequest, NullColumnIsRefusedAndNullTypeThrowsReleasingTheLock)
-{
-    static const char name[] = "name";
-    DACreateRequest request;
     LogCapture log;
     request.SetColumnKey(nullptr, "TEXT");
-    EXPECT_THROW(request.SetColumnKey(name, nullptr), std::logic_error);
-    EXPECT_TRUE(ColumnsOf(request).empty());
-    request.SetColumnKey(name, "TEXT");  // would deadlock if the lock were still held
-    EXPECT_EQ(ColumnsOf(request), (DAColumnList{{name, "TEXT"}}));
-    EXPECT_EQ(Strings{"6 DACreateRequest.cpp:SetColumnKey > NULL COLUMN NAME, COLUMN NOT ADDED"}, Described(log));
+    EXPECT_THROW(request.SetColumnKey(x, nullptr), std::logic_error);
+    request.SetColumnKey(x, "TEXT");  // would deadlock if the lock were still held
+    request.SetColumnKey(y, "INTEGER");
+    request.SetColumnKey(x, "");
+    DAColumnList columns{{"stale", "TEXT"}};
+    request.GetColumnKey(columns);
+    EXPECT_EQ(columns, (DAColumnList{{x, "TEXT"}, {y, "INTEGER"}, {x, ""}}));
+    EXPECT_EQ(Strings{Logged(6, "DACreateRequest.cpp", "SetColumnKey", "NULL COLUMN NAME, COLUMN NOT ADDED")},
+              Described(log));
 }
 
 }  // namespace
