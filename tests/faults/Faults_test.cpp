@@ -158,7 +158,8 @@ TEST_P(AllocFailure, FailsCleanlyAtEveryAllocationAndStaysUsable)
     const auto state = [&](bool reseed) {
         const auto overwrite = std::filesystem::copy_options::overwrite_existing;
         reseed&& std::filesystem::copy_file(PathOf("seed.db"), PathOf("t.db"), overwrite);
-        return RawDb(PathOf("t.db")).Query("SELECT name FROM sqlite_master; SELECT * FROM t");
+        RawDb raw(PathOf("t.db"));
+        return raw.Query("SELECT name FROM sqlite_master") + "/" + raw.Query("SELECT * FROM t");
     };
     dlog_set_sink(&Sink, nullptr);
     for (const auto& [op, run] : ops) {
