@@ -24,15 +24,6 @@ std::string Line(int priority, const std::string& function, const std::string& m
 
 const std::string kOpenFailed = Line(6, "OpenDB", "DB open failed. Error no(14): unable to open database file");
 
-// Points request at table in the test file of dir.
-template <typename Request>
-Request& At(Request& request, const std::string& dir, const char* table)
-{
-    request.SetPath(dir.c_str(), kFile);
-    request.SetTable(table);
-    return request;
-}
-
 // A cursor holding one row of its own, to see whether an operation replaced it.
 void Preload(DACursor& cursor)
 {

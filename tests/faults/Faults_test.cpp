@@ -95,19 +95,6 @@ Strings Dump(DACursor& cursor)
     return out;
 }
 
-std::string FileBytes(const std::string& path)
-{
-    return {std::istreambuf_iterator<char>(std::ifstream(path, std::ios::binary).rdbuf()), {}};
-}
-
-template <typename Request>
-Request& At(Request& request, const std::string& dir, const char* table)
-{
-    request.SetPath(dir.c_str(), "t.db");
-    request.SetTable(table);
-    return request;
-}
-
 class AllocFailure : public TempDirTest, public ::testing::WithParamInterface<Allocator> {};
 
 TEST_P(AllocFailure, FailsCleanlyAtEveryAllocationAndStaysUsable)

@@ -6,6 +6,7 @@
 // open-descriptor count of the process.
 
 #include <filesystem>
+#include <fstream>
 #include <iterator>
 #include <string>
 #include <vector>
@@ -17,6 +18,21 @@
 #include "LogCapture.h"
 
 using Strings = std::vector<std::string>;
+
+// Points request at table in the file "t.db" of dir.
+template <typename Request>
+Request& At(Request& request, const std::string& dir, const char* table)
+{
+    request.SetPath(dir.c_str(), "t.db");
+    request.SetTable(table);
+    return request;
+}
+
+// The bytes of a file, to see that it is unchanged.
+inline std::string FileBytes(const std::string& path)
+{
+    return {std::istreambuf_iterator<char>(std::ifstream(path, std::ios::binary).rdbuf()), {}};
+}
 
 // One log line as Described shows it: "priority file:function > message".
 inline std::string Logged(int priority, const std::string& file, const std::string& function,

@@ -5,8 +5,6 @@
 #include <unistd.h>
 
 #include <chrono>
-#include <fstream>
-#include <iterator>
 #include <thread>
 #include <tuple>
 
@@ -41,7 +39,6 @@ protected:
         return m_batch.Add(upsert);
     }
 
-    std::string Bytes() { return {std::istreambuf_iterator<char>(std::ifstream(PathOf(kFile)).rdbuf()), {}}; }
     std::string Rows(const char* sql = "SELECT * FROM people ORDER BY _ID") { return RawDb(PathOf(kFile)).Query(sql); }
 
     DADatabase m_db;
@@ -81,11 +78,11 @@ TEST_F(DABatchTest, FailingStatementLeavesTheFileByteForByte)
         AddUpsert(5, "Ahn");
         AddUpsert(6, name, table);
         AddUpsert(7, "Yun");
-        const std::string before = Bytes();
+        const std::string before = FileBytes(PathOf(kFile));
         LogCapture log;
         EXPECT_EQ(rc, m_db.ExecuteBatch(m_batch));
         EXPECT_EQ(Strings{std::string("6 DADatabase.cpp:ExecuteBatch > ") + line}, Described(log));
-        EXPECT_EQ(before, Bytes());
+        EXPECT_EQ(before, FileBytes(PathOf(kFile)));
     }
 }
 
