@@ -7,6 +7,7 @@
 
 #include <DABasePath.h>
 #include <DABaseSet.h>
+#include <DABatchRequest.h>
 #include <DAColumnName.h>
 #include <DACreateRequest.h>
 #include <DACursor.h>
@@ -17,6 +18,7 @@
 #include <DAJoinRequest.h>
 #include <DALogger.h>
 #include <DAMutex.h>
+#include <DAQueryRequest.h>
 #include <DASelectRequest.h>
 #include <DASqlGenerator.h>
 #include <DAUpdateRequest.h>
