@@ -16,7 +16,16 @@ TEST(DABasePath, GetPathYieldsCopiesOrThrowsForAnUnsetPart)
     DABasePath path;
     std::string outDir = "old dir";
     std::string outFile = "old file";
-    EXPECT_THROW(path.GetPath(outDir, outFile), std::logic_error);
+    const auto thrown = [&] {
+        try {
+            path.GetPath(outDir, outFile);
+        } catch (const std::logic_error& error) {
+            return std::string(error.what());
+        }
+        return std::string("nothing thrown");
+    };
+    const std::string unset = "DABasePath::GetPath: the database ";
+    EXPECT_EQ(unset + "directory is not set", thrown());
     path.SetPath("/old", "old.db");
     path.SetPath(dir, file);
     std::strcpy(dir, "/xxxx/xxxxx");
@@ -25,9 +34,9 @@ TEST(DABasePath, GetPathYieldsCopiesOrThrowsForAnUnsetPart)
     EXPECT_EQ(outDir + "|" + outFile, "/data/notes|notes.db");
     path.SetPath(nullptr, "b.db");
     outDir = "old dir";
-    EXPECT_THROW(path.GetPath(outDir, outFile), std::logic_error);
+    EXPECT_EQ(unset + "directory is not set", thrown());
     EXPECT_EQ(outDir + "|" + outFile, "old dir|notes.db");
     path.SetPath("", nullptr);
-    EXPECT_THROW(path.GetPath(outDir, outFile), std::logic_error);
+    EXPECT_EQ(unset + "file name is not set", thrown());
     EXPECT_EQ(outDir + "|" + outFile, "|notes.db");
 }
