@@ -179,6 +179,7 @@ TEST(DAColumnName, OnePointerPerTextFromManyThreadsNamesEachColumnOnce)
         EXPECT_EQ(8, std::count_if(seen.begin(), seen.end(), [&](const auto& s) { return s[n] == seen[0][n]; }));
     }
     EXPECT_EQ(nullptr, DAColumnName::Intern(nullptr));
+    EXPECT_STREQ("", DAColumnName::Intern(""));
 
     DABaseSet set;  // names rebuilt in every round: each column once, first value kept
     for (int i = 0; i < 9; ++i) {  // three rounds over three columns

@@ -57,11 +57,17 @@ TEST(ConcurrentRequestFill, EveryInsertionLands)
     const auto names = MakeNames("c");
     DAUpdateRequest request;
     DACreateRequest create;
+    DAQueryRequest query;
     RunTogether([&](int t) {
         for (int i = 0; i < kPerThread; ++i) {
             request.SetData(names[t][i].c_str(), i);
             request.SetWhere(names[t][i].c_str(), 0.5 + i);
             create.SetColumnKey(names[t][i].c_str(), i % 2 == 0 ? "TEXT" : "INTEGER");
+        }
+    });
+    RunTogether([&](int t) {  // alone, so that the appends really collide
+        for (int i = 0; i < 200 * kPerThread; ++i) {
+            query.SetOrderBy(names[t][i % kPerThread].c_str(), i % 2 == 0);
         }
     });
     DAValueMap data;
@@ -70,7 +76,10 @@ TEST(ConcurrentRequestFill, EveryInsertionLands)
     request.GetDataMap(data);
     request.GetWhereMap(where);
     create.GetColumnKey(columns);
+    DAOrderKeys keys;
+    query.GetOrderBy(keys);
     ASSERT_EQ(data.size(), static_cast<size_t>(kThreads * kPerThread));
+    ASSERT_EQ(keys.size(), 200 * data.size());
     ASSERT_EQ(where.size(), data.size());
     ASSERT_EQ(columns.size(), data.size());
     for (int t = 0; t < kThreads; ++t) {

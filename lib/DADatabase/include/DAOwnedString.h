@@ -16,10 +16,9 @@ public:
     DAOwnedString& operator=(const DAOwnedString&) = delete;
 
     /// Takes other's text; other then holds nothing. Never throws, so
-    /// owned strings can live in a std::vector.
+    /// owned strings can live in a std::vector (which only appends them).
     DAOwnedString(DAOwnedString&& other) noexcept;
-    /// Releases the held text and takes other's; other then holds nothing.
-    DAOwnedString& operator=(DAOwnedString&& other) noexcept;
+    DAOwnedString& operator=(DAOwnedString&& other) = delete;
 
     /// Replaces the held text by a fresh copy of text and releases the old
     /// copy. A null text changes nothing. On std::bad_alloc the old text is
@@ -43,8 +42,8 @@ private:
 };
 
 /// The pair rule of the requests' two-part getters: when both first and
-/// second hold a text, assigns them to outFirst and outSecond and returns
-/// true; otherwise touches neither output and returns false.
-bool DACopyPair(const DAOwnedString& first, const DAOwnedString& second, std::string& outFirst, std::string& outSecond);
+/// second hold a text, assigns them to outFirst and outSecond; otherwise
+/// touches neither output.
+void DACopyPair(const DAOwnedString& first, const DAOwnedString& second, std::string& outFirst, std::string& outSecond);
 
 #endif  // DAOWNEDSTRING_H

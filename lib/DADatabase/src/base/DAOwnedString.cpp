@@ -12,15 +12,6 @@ DAOwnedString::DAOwnedString(DAOwnedString&& other) noexcept : m_text(std::excha
 {
 }
 
-DAOwnedString& DAOwnedString::operator=(DAOwnedString&& other) noexcept
-{
-    if (this != &other) {
-        delete[] m_text;
-        m_text = std::exchange(other.m_text, nullptr);
-    }
-    return *this;
-}
-
 void DAOwnedString::Assign(char const* text)
 {
     if (text == nullptr) {
@@ -48,12 +39,10 @@ bool DAOwnedString::CopyTo(std::string& out) const
     return true;
 }
 
-bool DACopyPair(const DAOwnedString& first, const DAOwnedString& second, std::string& outFirst, std::string& outSecond)
+void DACopyPair(const DAOwnedString& first, const DAOwnedString& second, std::string& outFirst, std::string& outSecond)
 {
-    if (!first.IsSet() || !second.IsSet()) {
-        return false;
+    if (first.IsSet() && second.IsSet()) {
+        first.CopyTo(outFirst);
+        second.CopyTo(outSecond);
     }
-    first.CopyTo(outFirst);
-    second.CopyTo(outSecond);
-    return true;
 }
