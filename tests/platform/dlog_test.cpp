@@ -38,9 +38,10 @@ TEST(DlogDefaultSink, WritesOneLetterTaggedLinePerCallToStandardError)
     EXPECT_EQ(__dlog_print(LOG_ID_MAIN, DLOG_INFO, "ULO_DB", "a.cpp: Run(%d) > %s", 12, "done"), 21);
     __dlog_print(LOG_ID_MAIN, DLOG_WARN, "ULO_DB", "busy");
     __dlog_print(LOG_ID_MAIN, DLOG_ERROR, nullptr, "no tag");
+    __dlog_print(LOG_ID_MAIN, 99, "T", "unknown priority");
     EXPECT_LT(__dlog_print(LOG_ID_MAIN, DLOG_ERROR, "ULO_DB", nullptr), 0);
     EXPECT_EQ(::testing::internal::GetCapturedStderr(),
-              "I/ULO_DB: a.cpp: Run(12) > done\nW/ULO_DB: busy\nE/: no tag\n");
+              "I/ULO_DB: a.cpp: Run(12) > done\nW/ULO_DB: busy\nE/: no tag\n?/T: unknown priority\n");
 }
 
 // A sink receives every field without a newline until it is reset, a line
