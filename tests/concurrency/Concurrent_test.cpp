@@ -160,14 +160,8 @@ TEST_F(ConcurrentDatabase, EverySucceededWriteIsInTheFile)
 {
     constexpr int kRows = 8;
     const std::string dir = Dir();
-    const auto at = [&dir](auto& request) -> auto&
-    {
-        request.SetPath(dir.c_str(), "shared.db");
-        request.SetTable("items");
-        return request;
-    };
     DACreateRequest create;
-    at(create).SetPrimaryKey("name", "TEXT");
+    At(create, dir, "items").SetPrimaryKey("name", "TEXT");
     create.SetColumnKey("value", "TEXT");
     ASSERT_EQ(DADatabase().CreateTable(create), 0);
 
@@ -178,17 +172,17 @@ TEST_F(ConcurrentDatabase, EverySucceededWriteIsInTheFile)
             const std::string name = "row" + std::to_string(t) + "_" + std::to_string(i);
             const std::string updated = "updated " + name;
             DAUpsertRequest upsert;
-            at(upsert).SetData("name", name.c_str());
+            At(upsert, dir, "items").SetData("name", name.c_str());
             upsert.SetData("value", "inserted");
             EXPECT_EQ(database.Upsert(upsert), 0) << name;
             DAUpdateRequest update;
-            at(update).SetData("value", updated.c_str());
+            At(update, dir, "items").SetData("value", updated.c_str());
             update.SetWhere("name", name.c_str());
             EXPECT_EQ(database.Update(update), 0) << name;
         }
     });
     // Every row is there (names are the key), each with its own update.
-    EXPECT_EQ(RawDb(PathOf("shared.db")).Query("SELECT count(*), sum(value = 'updated ' || name) FROM items"),
+    EXPECT_EQ(RawDb(PathOf("t.db")).Query("SELECT count(*), sum(value = 'updated ' || name) FROM items"),
               std::to_string(kThreads * kRows) + "|" + std::to_string(kThreads * kRows));
     EXPECT_EQ(log.Count("RETRY COUNT is reached LIMIT, SQLITE_BUSY"), 0);
 }

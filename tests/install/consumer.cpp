@@ -2,7 +2,6 @@
 // package: it includes every public header and calls into all three
 // libraries, then checks one round trip through a real database file.
 #include <cstdio>
-#include <cstdlib>
 #include <string>
 
 #include <DABasePath.h>

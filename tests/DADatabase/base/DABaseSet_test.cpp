@@ -4,7 +4,6 @@
 #include <future>
 #include <memory>
 #include <stdexcept>
-#include <string>
 #include <thread>
 
 #include <gtest/gtest.h>
