@@ -22,10 +22,10 @@ declare -A ULO_GROUPS=(
     [docs]="doxygen"
     [bench]="libbenchmark-dev libsqlitecpp-dev gnuplot-nox python3"
     [package]="dpkg pkg-config"
-    [fuzz]="clang libclang-rt-14-dev"
+    [clang]="clang libclang-rt-14-dev"
 )
 
-step() { printf '\n==> %s\n' "$*"; }
+step() { printf '\n==> [%d s] %s\n' "$SECONDS" "$*"; }
 
 ulo_install() {
     local group name wanted=() missing=() names sudo=""
