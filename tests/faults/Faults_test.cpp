@@ -292,13 +292,15 @@ TEST_F(Faults, KilledWriterLosesNoAcknowledgedRow)
     for (int round = 0; round < 6; ++round) {
         int fds[2];
         const pid_t pid = pipe(fds) == 0 ? fork() : -1;
-        for (int k = round * 1000000; pid == 0; ++k) {  // the writer: reports each row whose Upsert returned 0
+        if (pid == 0) {  // the writer, until killed: reports each row whose Upsert returned 0
             dlog_set_sink(&dlog_discard_sink, nullptr);
-            DAUpsertRequest request;
-            At(request, Dir(), "t").SetData("k", k);
-            request.SetData("v", std::string(k % 900, 'v').c_str());
-            if (DADatabase().Upsert(request) == 0 && write(fds[1], &k, sizeof k) != sizeof k) {
-                _exit(1);
+            for (int k = round * 1000000;; ++k) {
+                DAUpsertRequest request;
+                At(request, Dir(), "t").SetData("k", k);
+                request.SetData("v", std::string(k % 900, 'v').c_str());
+                if (DADatabase().Upsert(request) == 0 && write(fds[1], &k, sizeof k) != sizeof k) {
+                    _exit(1);
+                }
             }
         }
         ASSERT_GT(pid, 0);
