@@ -2,7 +2,9 @@
 # target that each target links privately (nothing is set globally).
 add_library(ulo_db_build_options INTERFACE)
 target_compile_features(ulo_db_build_options INTERFACE cxx_std_17)
-target_compile_options(ulo_db_build_options INTERFACE -Wall -Wextra -Werror=format)
+# -g in every configuration: Release code is the same with it, and the
+# Debian packaging strips it into the -dbgsym package.
+target_compile_options(ulo_db_build_options INTERFACE -Wall -Wextra -Werror=format -g)
 
 if(ULO_DB_SANITIZER STREQUAL "address")
     set(_ulo_sanitize -fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer)

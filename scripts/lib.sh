@@ -20,8 +20,9 @@ declare -A ULO_GROUPS=(
     [arm]="cmake g++-arm-linux-gnueabihf qemu-user googletest ninja-build"
     [static]="clang-tidy clang-format"
     [docs]="doxygen"
-    [bench]="libbenchmark-dev libsqlitecpp-dev gnuplot-nox python3"
-    [package]="dpkg pkg-config"
+    [bench]="libbenchmark-dev libsqlitecpp-dev python3"
+    [package]="dpkg dpkg-dev file binutils lintian gdb pkg-config"
+    [armhf-runtime]="libc6:armhf libstdc++6:armhf libgcc-s1:armhf libsqlite3-0:armhf"
     [clang]="clang libclang-rt-14-dev"
 )
 

@@ -33,7 +33,10 @@ set(CMAKE_FIND_ROOT_PATH_MODE_PACKAGE ONLY)
 # variable on so they see the same setup.
 list(APPEND CMAKE_TRY_COMPILE_PLATFORM_VARIABLES ULO_DB_ARM_SQLITE_ROOT)
 
-set(_ulo_arm_ld_dirs "")
+# The cross toolchain's C library first: with the system's armhf C library
+# installed as well (multiarch, as the package check does), the loader's
+# cache would otherwise mix the two, and a mixed pair crashes.
+set(_ulo_arm_ld_dirs "${ULO_DB_ARM_LIBC_ROOT}/lib")
 if(ULO_DB_ARM_SQLITE_ROOT)
     set(_ulo_sqlite_libdir "${ULO_DB_ARM_SQLITE_ROOT}/usr/lib/${ULO_DB_ARM_TRIPLET}")
     set(SQLite3_INCLUDE_DIR "${ULO_DB_ARM_SQLITE_ROOT}/usr/include" CACHE PATH "armhf sqlite3.h")

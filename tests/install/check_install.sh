@@ -2,7 +2,9 @@
 # Installs the build tree into a fresh prefix, then builds and runs a program
 # against the installed package twice: once with pkg-config, once with
 # CMake's find_package. The programs run with LD_LIBRARY_PATH unset: the
-# installed libraries must find each other on their own.
+# installed libraries must find each other on their own, by their run path
+# $ORIGIN. Installed under the prefix /usr (staged with DESTDIR) they carry
+# no run path at all, as system libraries.
 # Usage: check_install.sh BUILD_DIR CXX
 set -euo pipefail
 build_dir=$1
@@ -15,6 +17,19 @@ prefix=$work/prefix
 cmake --install "$build_dir" --prefix "$prefix" >/dev/null
 libdir=$(dirname "$(find "$prefix" -name 'libulo_db.so' -print -quit)")
 unset LD_LIBRARY_PATH
+
+# The run path of each installed library, "-" for none.
+runpaths() {
+    local library
+    for library in "$1"/lib{ulo_db,ulo_util,dlog}.so.1; do
+        printf '%s ' "$(readelf -d "$library" | sed -nE 's/.*\((RUNPATH|RPATH)\).*\[(.*)\]/\2/p' | grep . || echo -)"
+    done
+}
+echo "-- run paths: under $prefix \$ORIGIN, under /usr none"
+[[ $(runpaths "$libdir") == '$ORIGIN $ORIGIN $ORIGIN ' ]] || { echo "under $prefix: $(runpaths "$libdir")" >&2 && exit 1; }
+DESTDIR=$work/staged cmake --install "$build_dir" --prefix /usr >/dev/null
+staged=$work/staged/usr/${libdir#"$prefix"/}
+[[ $(runpaths "$staged") == '- - - ' ]] || { echo "under /usr: $(runpaths "$staged")" >&2 && exit 1; }
 
 echo "-- pkg-config"
 export PKG_CONFIG_PATH=$libdir/pkgconfig
