@@ -1,14 +1,17 @@
 // A tour of libulo_db on a real database file: create two related tables,
 // write, query, join, list a table sorted and a page at a time, store a
 // 64-bit time stamp, name columns at run time, check and drop, write in a
-// batch, printing each step's result code, the
-// statement the library generated, every result as a table, and the
-// library's own log lines as they are written.
+// batch, keep an event journal for a week (retention by a range, counts per
+// type, keyset pages), upgrade a schema in versioned steps and compact the
+// file, printing each step's result code, the statement the library
+// generated, every result as a table, and the library's own log lines as
+// they are written.
 //
 //   ulo_db_demo [directory]     (default: /tmp/ulo_db_demo, created if missing)
 //
 // Running it again on the same folder gives the same output: every write is
-// an insert-or-replace on a keyed table, and the scratch table is dropped.
+// an insert-or-replace on a keyed table, the scratch table is dropped, and
+// the upgrade starts from a new file.
 
 #include <sys/stat.h>
 
@@ -406,6 +409,154 @@ void WriteBatch(DADatabase& db, DASqlGenerator& generator, const char* dir)
     Write(db, "Drop readings", drop, &DASqlGenerator::GetDropTableSql, &DADatabase::DropTable);
 }
 
+// A firmware update's schema upgrade: one step per version (a table, an
+// added column, an index), run in order at every start. The first start
+// brings a new file from version 0 to 3; the second finds it up to date
+// and skips every step.
+void Upgrade(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    const char* const file = "upgrade.db";
+    std::remove((std::string(dir) + "/" + file).c_str());  // a new file at each demo run
+    DACreateRequest table;
+    table.SetTable("events");
+    table.SetColumnKey("ts", "INTEGER");
+    DAAddColumnRequest level;
+    level.SetTable("events");
+    level.SetColumn("level", "INTEGER");
+    level.SetDefault("0");
+    DACreateIndexRequest index;
+    index.SetTable("events");
+    index.SetName("events_ts");
+    index.AddColumn("ts", true);
+    std::string sql[3];
+    generator.GetCreateTableSql(table, sql[0]);
+    generator.GetAddColumnSql(level, sql[1]);
+    generator.GetCreateIndexSql(index, sql[2]);
+    for (int start = 1; start <= 2; ++start) {
+        for (int version = 1; version <= 3; ++version) {
+            DABatchRequest step;
+            step.SetPath(dir, file);
+            version == 1 ? step.Add(table) : version == 2 ? step.Add(level) : step.Add(index);
+            const std::string title =
+                "Start " + std::to_string(start) + ": Migrate to version " + std::to_string(version);
+            Step(title.c_str(), sql[version - 1]);
+            Result(db.Migrate(step, version), SQLITE_OK);
+        }
+    }
+    DABasePath location;
+    location.SetPath(dir, file);
+    int version = -1;
+    Result(db.GetVersion(location, version), SQLITE_OK);
+    std::printf("   %s is at version %d\n", file, version);
+}
+
+// Deleted rows (here the dropped readings) leave free pages in the file
+// until Compact gives them back.
+void Space(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    DABasePath location;
+    location.SetPath(dir, kFile);
+    std::int64_t fileBytes = 0;
+    std::int64_t freeBytes = 0;
+    const auto print = [&] {
+        Result(db.GetSpace(location, fileBytes, freeBytes), SQLITE_OK);
+        std::printf("   file: %lld bytes, free: %lld bytes\n", static_cast<long long>(fileBytes),
+                    static_cast<long long>(freeBytes));
+    };
+    std::string sql;
+    generator.GetCompactSql(location, sql);
+    Step("Space before compacting", "PRAGMA page_count, freelist_count, page_size");
+    print();
+    Step("Compact: rewrite the file without its free pages", sql);
+    Result(db.Compact(location), SQLITE_OK);
+    print();
+}
+
+// An event journal kept for a week: events go in with Insert (in a batch),
+// a retention pass deletes the older ones by a range condition, a count per
+// type summarises the rest, and keyset pages list them newest first.
+void Retention(DADatabase& db, DASqlGenerator& generator, const char* dir)
+{
+    const std::int64_t day = 24LL * 3600 * 1000;
+    const std::int64_t now = 1700000000123;
+    DACreateRequest create;
+    SetLocation(create, dir, "journal");
+    create.SetPrimaryKey(kId, "INTEGER");
+    create.SetColumnKey("at_ms", "INTEGER");
+    create.SetColumnKey("type", "TEXT");
+    Write(db, "Create the table journal", create, &DASqlGenerator::GetCreateTableSql, &DADatabase::CreateTable);
+
+    DABatchRequest batch;
+    batch.SetPath(dir, kFile);
+    const char* const types[] = {"alarm", "door", "alarm", "info"};
+    std::string sql;
+    for (int i = 0; i < 10; ++i) {  // one event a day for ten days
+        DAInsertRequest insert;
+        insert.SetTable("journal");
+        insert.SetData(kId, i + 1);
+        insert.SetData("at_ms", now - (9 - i) * day);
+        insert.SetData("type", types[i % 4]);
+        generator.GetInsertSql(insert, sql);
+        batch.Add(insert);
+    }
+    Step("Insert ten days of events in one batch", sql + "  (last of 10)");
+    Result(db.ExecuteBatch(batch), SQLITE_OK);
+
+    DAInsertRequest again;  // the same id once more: kept out, no failure
+    SetLocation(again, dir, "journal");
+    again.SetData(kId, 1);
+    again.SetData("type", "door");
+    again.SetIgnoreExisting();
+    generator.GetInsertSql(again, sql);
+    Step("Insert an event whose id exists, ignoring it", sql);
+    std::int64_t rowId = 0;
+    Result(db.Insert(again, rowId), SQLITE_OK);
+    std::printf("   row id: %lld (-1: the row was there)\n", static_cast<long long>(rowId));
+
+    DADeleteRequest old;
+    SetLocation(old, dir, "journal");
+    old.SetWhere("at_ms", DACompare::Less, now - 7 * day);
+    generator.GetDeleteSql(old, sql);
+    Step("Retention pass: delete what is older than a week", sql);
+    int removed = 0;
+    Result(db.Delete(old, removed), SQLITE_OK);
+    std::printf("   rows deleted: %d\n", removed);
+
+    DAQueryRequest perType;
+    SetLocation(perType, dir, "journal");
+    perType.AddColumn("type");
+    perType.AddAggregate(DAAggregate::Count, nullptr, "n");
+    perType.AddAggregate(DAAggregate::Max, "at_ms", "newest");
+    perType.AddGroupBy("type");
+    perType.SetOrderBy("n", true);
+    perType.SetOrderBy("type");
+    generator.GetQuerySql(perType, sql);
+    DACursor cursor;
+    Step("Count the events per type", sql);
+    Result(db.Query(perType, cursor), SQLITE_OK);
+    PrintCursor(cursor);
+
+    std::int64_t last = INT64_MAX;
+    for (int page = 1; page <= 2; ++page) {  // the next page starts below the last time stamp shown
+        DAQueryRequest events;
+        SetLocation(events, dir, "journal");
+        events.SetWhere("at_ms", DACompare::Less, last);
+        events.SetOrderBy("at_ms", true);
+        events.SetLimit(3);
+        generator.GetQuerySql(events, sql);
+        Step(("Newest events, keyset page " + std::to_string(page)).c_str(), sql);
+        Result(db.Query(events, cursor), SQLITE_OK);
+        PrintCursor(cursor);
+        cursor.MoveToLast();
+        cursor.MoveToPrev();
+        cursor.GetInt64("at_ms", last);
+    }
+
+    DADropRequest drop;
+    SetLocation(drop, dir, "journal");
+    Write(db, "Drop journal", drop, &DASqlGenerator::GetDropTableSql, &DADatabase::DropTable);
+}
+
 }  // namespace
 
 int main(int argc, char** argv)
@@ -429,6 +580,9 @@ int main(int argc, char** argv)
     RunTimeNames(db, generator, dir);
     CheckAndDrop(db, generator, dir);
     WriteBatch(db, generator, dir);
+    Retention(db, generator, dir);
+    Upgrade(db, generator, dir);
+    Space(db, generator, dir);
 
     std::printf("\n%s\n", g_unexpected == 0 ? "Every step gave the expected result." : "Some steps failed.");
     return g_unexpected == 0 ? 0 : 1;

@@ -1,10 +1,15 @@
 #!/usr/bin/env bash
 # Builds and runs every test the project has, each suite in its own build:
-#   host     the suite on this machine
-#   arm      the suite built for 32-bit ARM, run under qemu-arm
-#   asan     the suite under AddressSanitizer + UndefinedBehaviorSanitizer (leaks too)
+#   host     the suite on this machine, the install and README checks, the
+#            test names; the amd64 Debian packages (lintian; as root
+#            installed, used, purged)
+#   arm      the suite built for 32-bit ARM, run under qemu-arm; the armhf
+#            packages (lintian; installed next to the amd64 ones, used, purged)
+#   asan     the suite under AddressSanitizer + UndefinedBehaviorSanitizer
+#            (leaks too), then the libFuzzer target for 60 s
 #   tsan     the suite under ThreadSanitizer
-#   static   clang-tidy and the clang-format check
+#   static   clang-tidy, the clang-format check and Doxygen over the public
+#            headers (any warning fails)
 # With no argument all of them run; name some to run only those
 # (scripts/test.sh host is the quick loop). Stops at the first failure.
 set -euo pipefail
@@ -13,19 +18,20 @@ root=$ULO_ROOT
 suites=("$@")
 [[ ${#suites[@]} -gt 0 ]] || suites=(host arm asan tsan static)
 
-# The host suite ends with the Debian packages: installed into /usr, used by
-# an outside program and removed again, which needs root.
+# The host suite ends with the Debian packages: checked with lintian, and as
+# root installed into /usr, used by an outside program and purged again.
 run_host() {
     ulo_install build tests package
     ulo_configure "$root/build" -DULO_DB_BUILD_TESTS=ON >/dev/null
     cmake --build "$root/build" -j"$ULO_JOBS"
     (cd "$root/build" && ctest --output-on-failure -j"$ULO_JOBS")
-    step "Debian packages (amd64): dpkg -i, an outside program against /usr, dpkg -r"
-    if [[ $(id -u) -eq 0 ]]; then
-        "$root/tests/install/check_debs.sh" "$root/build" host
-    else
-        echo "skipped: installing packages needs root"
+    step "Test names: a parameterised case is named by its generator, never by an index or its bytes"
+    if (cd "$root/build" && ctest -N) | grep -E '^ *Test +#' | grep -E '#.*#|/[0-9]+$'; then
+        echo "name these cases: INSTANTIATE_TEST_SUITE_P(..., name generator)" >&2
+        return 1
     fi
+    step "Debian packages (amd64): lintian; dpkg -i, an outside program against /usr, gdb, purge"
+    "$root/tests/install/check_debs.sh" "$root/build" host
 }
 
 run_suite() {

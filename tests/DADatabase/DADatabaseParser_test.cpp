@@ -135,3 +135,22 @@ TEST_F(DADatabaseParserTest, BusyStepGivesUpAfterFifteenWaits)
     EXPECT_GE(seconds, 1.4);
     EXPECT_LT(seconds, 10.0);
 }
+
+// ParseRows tells how the rows ended: 101 after all of them; the busy
+// limit's 5 with its text; a failed step's code (the function's error is a
+// plain 1) with its text, the rows before it kept.
+TEST_F(DADatabaseParserTest, ParseRowsReturnsHowTheRowsEnded)
+{
+    std::string failure;
+    EXPECT_EQ(SQLITE_ERROR,
+              m_parser.ParseRows(m_db->Handle(), Prepare("SELECT fail_on(3, v) AS v FROM t"), m_cursor, failure));
+    EXPECT_EQ("third row refused", failure);
+    EXPECT_EQ((Strings{"1", "2"}), ColumnValues(m_cursor, "v"));
+    sqlite3_stmt* stmt = Prepare("SELECT v FROM t");
+    RawDb holder(PathOf("parse.db"));
+    holder.Run("BEGIN EXCLUSIVE");
+    const LogCapture quiet;
+    EXPECT_EQ(SQLITE_BUSY, m_parser.ParseRows(m_db->Handle(), stmt, m_cursor, failure));
+    EXPECT_EQ("database is locked", failure);
+    holder.Run("COMMIT");
+}

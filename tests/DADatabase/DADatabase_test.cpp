@@ -2,6 +2,7 @@
 
 #include <chrono>
 #include <functional>
+#include <iterator>
 #include <stdexcept>
 #include <string>
 #include <thread>
@@ -269,16 +270,22 @@ TEST_F(DADatabaseTest, OpenDBHandsBackNullOnFailureAndEveryOperationItsCode)
     DACursor cursor;
     Preload(cursor);
     DASelectRequest select;
+    DAQueryRequest query;
     DAJoinRequest join;
     join.SetPath(missing.c_str(), kFile);
     bool exists = true;
-    EXPECT_EQ(14, kWriteCases[0].run(m_db, missing));
+    for (const WriteCase& write : kWriteCases) {
+        EXPECT_EQ(14, write.run(m_db, missing)) << write.function;
+    }
     EXPECT_EQ(14, m_db.Select(At(select, missing, "contacts"), cursor));
+    EXPECT_EQ(14, m_db.Query(At(query, missing, "contacts"), cursor));
     EXPECT_EQ(14, m_db.JoinSelect(join, cursor));
     EXPECT_EQ(14, m_db.CheckExistTable(join, "contacts", exists));
-    EXPECT_EQ((Strings{kOpenFailed, kOpenFailed, kOpenFailed, Line(4, "Select", "OpenDB Error: 14"), kOpenFailed,
-                       kOpenFailed}),
-              Described(log));
+    Strings expected(1 + std::size(kWriteCases) + 1, kOpenFailed);  // OpenDB's own, each write's, Select's
+    expected.insert(expected.end(),
+                    {Line(4, "Select", "OpenDB Error: 14"), kOpenFailed, Line(4, "Query", "OpenDB Error: 14"),
+                     kOpenFailed, kOpenFailed});
+    EXPECT_EQ(expected, Described(log));
     EXPECT_EQ(Strings{"kept"}, ColumnValues(cursor, "mine"));
     EXPECT_TRUE(exists);
     EXPECT_FALSE(FileExists("missing"));

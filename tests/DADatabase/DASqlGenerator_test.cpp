@@ -1,5 +1,6 @@
 #include "DASqlGenerator.h"
 
+#include <cstdint>
 #include <string>
 #include <utility>
 #include <vector>
@@ -29,6 +30,7 @@ struct SqlCase {
     Pairs first;
     Pairs second;
     const char* expected;
+    void (*more)(DABaseSet&) = nullptr;  // listed conditions, select list, ignore
 };
 
 // A request of the table kind: data from first, conditions from second.
@@ -41,6 +43,9 @@ void Fill(Request& request, const SqlCase& c)
     }
     for (const auto& entry : c.second) {
         request.SetWhere(entry.first, entry.second);
+    }
+    if (c.more != nullptr) {
+        c.more(request);
     }
 }
 
@@ -66,6 +71,34 @@ void Fill(DAJoinRequest& request, const SqlCase& c)
     for (const auto& entry : c.second) {
         request.SetWhere(entry.first, entry.second);
     }
+    if (c.more != nullptr) {
+        c.more(request);
+    }
+}
+
+// first: the index's name and "UNIQUE" or ""; second: columns and "DESC" or "".
+void Fill(DACreateIndexRequest& request, const SqlCase& c)
+{
+    request.SetTable(c.table);
+    request.SetName(c.first.at(0).first);
+    request.SetUnique(std::string(c.first.at(0).second) == "UNIQUE");
+    for (const auto& column : c.second) {
+        request.AddColumn(column.first, std::string(column.second) == "DESC");
+    }
+}
+
+// first: the column and its type; second: the default, if any.
+void Fill(DAAddColumnRequest& request, const SqlCase& c)
+{
+    request.SetTable(c.table);
+    request.SetColumn(c.first.at(0).first, c.first.at(0).second);
+    for (const auto& value : c.second) {
+        request.SetDefault(value.second);
+    }
+}
+
+void Fill(DABasePath& /*location*/, const SqlCase& /*c*/)
+{
 }
 
 // The statement of c's request: a fresh request filled from c.
@@ -102,6 +135,15 @@ const Kind kJoin = Generated<DAJoinRequest, &DASqlGenerator::GetJoinSql>;
 const Kind kUpsert = Generated<DAUpsertRequest, &DASqlGenerator::GetUpsertSql>;
 const Kind kUpdate = Generated<DAUpdateRequest, &DASqlGenerator::GetUpdateSql>;
 const Kind kDelete = Generated<DADeleteRequest, &DASqlGenerator::GetDeleteSql>;
+const Kind kIndex = Generated<DACreateIndexRequest, &DASqlGenerator::GetCreateIndexSql>;
+const Kind kAddColumn = Generated<DAAddColumnRequest, &DASqlGenerator::GetAddColumnSql>;
+const Kind kCompact = Generated<DABasePath, &DASqlGenerator::GetCompactSql>;
+const Kind kQuery = Generated<DAQueryRequest, &DASqlGenerator::GetQuerySql>;
+const Kind kInsert = Generated<DAInsertRequest, &DASqlGenerator::GetInsertSql>;
+
+// Listed conditions and select lists, as the rows below use them.
+const auto Q = [](DABaseSet& r) -> DAQueryRequest& { return static_cast<DAQueryRequest&>(r); };
+const auto TsBefore = [](DABaseSet& r) { r.SetWhere("ts", DACompare::Less, std::int64_t{1700000000000}); };
 
 const char* const kContacts = "contacts";
 const Pairs kNameText{{"name", "TEXT"}};
@@ -160,6 +202,53 @@ const SqlCase kCases[] = {
     {kDelete, kContacts, {}, {{kPhone, "010"}, {kName, "Kim"}},
      "DELETE  FROM contacts WHERE name='Kim' AND phone='010'"},
     {kDelete, kContacts, {}, {}, "DELETE  FROM contacts"},
+    {kIndex, "events", {{"events_ts", ""}}, {{"ts", "DESC"}, {"type", ""}},
+     "CREATE INDEX IF NOT EXISTS events_ts ON events (ts DESC, type)"},
+    {kIndex, "events", {{"events_id", "UNIQUE"}}, {{"id", ""}},
+     "CREATE UNIQUE INDEX IF NOT EXISTS events_id ON events (id)"},
+    {kAddColumn, "events", {{"level", "INTEGER"}}, {}, "ALTER TABLE events ADD COLUMN level INTEGER"},
+    {kAddColumn, "events", {{"level", "INTEGER"}}, {{"", "0"}},
+     "ALTER TABLE events ADD COLUMN level INTEGER DEFAULT '0'"},
+    {kAddColumn, "events", {{"note", "TEXT"}}, {{"", "it's"}},
+     "ALTER TABLE events ADD COLUMN note TEXT DEFAULT 'it''s'"},
+    {kCompact, nullptr, {}, {}, "VACUUM"},
+    {kSelect, "events", {}, {{"type", "alarm"}}, "SELECT * FROM events WHERE type='alarm' AND ts<1700000000000",
+     TsBefore},
+    {kSelect, "t", {}, {}, "SELECT * FROM t WHERE a=1 AND b<>'x' AND c<=-2.5 AND d>1e+20 AND e>=0.1 AND "
+     "f LIKE 'K%''s' AND g IN ('a', 'b''c') AND h IN () AND i IS NULL AND j.k IS NOT NULL", [](DABaseSet& r) {
+        r.SetWhere("a", DACompare::Equal, 1), r.SetWhere("b", DACompare::NotEqual, "x");
+        r.SetWhere("c", DACompare::LessEqual, -2.5), r.SetWhere("d", DACompare::Greater, 1e20);
+        r.SetWhere("e", DACompare::GreaterEqual, 0.1), r.SetWhere("f", DACompare::Like, "K%'s");
+        r.SetWhereIn("g", {"a", "b'c"}), r.SetWhereIn("h", {}), r.SetWhereNull("i"), r.SetWhereNull("j.k", false); }},
+    {kSelect, "t", {}, {}, "SELECT * FROM t WHERE u<18446744073709551615 AND s>-7 AND t='x AND y'", [](DABaseSet& r) {
+        r.SetWhere("u", DACompare::Less, UINT64_MAX), r.SetWhere("s", DACompare::Greater, short{-7});
+        r.SetWhere("t", DACompare::Equal, "x AND y"); }},
+    {kDelete, "events", {}, {}, "DELETE  FROM events WHERE ts<1700000000000", TsBefore},
+    {kDelete, "events", {}, {{"type", "alarm"}}, "DELETE  FROM events WHERE type='alarm' AND ts<1700000000000",
+     TsBefore},
+    {kUpdate, "settings", {{"v", "1"}}, {}, "UPDATE settings SET v = '1' WHERE k IN ('a', 'b')",
+     [](DABaseSet& r) { r.SetWhereIn("k", {"a", "b"}); }},
+    {kUpdate, "events", {{"v", "1"}}, {{"type", "alarm"}},
+     "UPDATE events SET v = '1' WHERE type='alarm' AND ts<1700000000000", TsBefore},
+    {kJoin, nullptr, {{"contacts", "group_id"}, {"groups", "id"}}, {{kTitle, "Family"}},
+     "SELECT  * FROM contacts INNER JOIN groups ON contacts.group_id = groups.id WHERE groups.title='Family' AND "
+     "ts<1700000000000", TsBefore},
+    {kUpsert, "t", {{kName, "Kim"}}, {}, "INSERT OR REPLACE INTO t (name) VALUES ('Kim')", TsBefore},  // ignored
+    {kQuery, "events", {}, {}, "SELECT * FROM events WHERE ts<1700000000000 ORDER BY ts DESC LIMIT 50",
+     [](DABaseSet& r) { TsBefore(r), Q(r).SetOrderBy("ts", true), Q(r).SetLimit(50); }},
+    {kQuery, "events", {}, {}, "SELECT type, COUNT(*) AS n, MAX(ts) AS newest FROM events WHERE ts>=5 "
+     "GROUP BY type ORDER BY n DESC LIMIT 5", [](DABaseSet& r) {
+        Q(r).AddColumn("type"), Q(r).AddAggregate(DAAggregate::Count, nullptr, "n");
+        Q(r).AddAggregate(DAAggregate::Max, "ts", "newest"), Q(r).AddGroupBy("type"), Q(r).SetOrderBy("n", true);
+        Q(r).SetLimit(5), r.SetWhere("ts", DACompare::GreaterEqual, 5); }},
+    {kQuery, "t", {}, {}, "SELECT COUNT(v) AS x, MIN(v) AS x, SUM(v) AS x, AVG(v) AS x FROM t GROUP BY a, b.c",
+     [](DABaseSet& r) { Q(r).AddAggregate(DAAggregate::Count, "v", "x"), Q(r).AddAggregate(DAAggregate::Min, "v", "x");
+        Q(r).AddAggregate(DAAggregate::Sum, "v", "x"), Q(r).AddAggregate(DAAggregate::Avg, "v", "x");
+        Q(r).AddGroupBy("a"), Q(r).AddGroupBy("b.c"); }},
+    {kInsert, kContacts, {{kPhone, "010"}, {kName, "Kim's"}}, {},
+     "INSERT INTO contacts (name, phone) VALUES ('Kim''s', '010')"},
+    {kInsert, kContacts, {{kName, "Kim"}}, {}, "INSERT OR IGNORE INTO contacts (name) VALUES ('Kim')",
+     [](DABaseSet& r) { static_cast<DAInsertRequest&>(r).SetIgnoreExisting(); }},
 };
 // clang-format on
 

@@ -14,11 +14,13 @@
 #include <DADatabaseParser.h>
 #include <DADeleteRequest.h>
 #include <DADropRequest.h>
+#include <DAInsertRequest.h>
 #include <DAJoinRequest.h>
 #include <DALogger.h>
 #include <DAMutex.h>
 #include <DAQueryRequest.h>
 #include <DASelectRequest.h>
+#include <DASession.h>
 #include <DASqlGenerator.h>
 #include <DAUpdateRequest.h>
 #include <DAUpsertRequest.h>
@@ -54,6 +56,11 @@ int main(int argc, char** argv)
     if (db.CreateTable(create) != 0 || db.Upsert(upsert) != 0 || db.Select(at(select), cursor) != 0 ||
         cursor.MoveToNext() != 0 || cursor.GetString("label", label) != 0 || label != "installed") {
         std::fprintf(stderr, "consumer: round trip failed\n");
+        return 1;
+    }
+    DASession session;  // the same row through a held connection
+    if (session.Open(create) != 0 || session.Select(select, cursor) != 0 || cursor.GetCount() != 1) {
+        std::fprintf(stderr, "consumer: session read failed\n");
         return 1;
     }
     std::printf("consumer: ok\n");

@@ -28,6 +28,14 @@ Request& At(Request& request, const std::string& dir, const char* table)
     return request;
 }
 
+// Points location (a batch, a session's file) at the file "t.db" of dir.
+template <typename Location>
+Location& At(Location& location, const std::string& dir)
+{
+    location.SetPath(dir.c_str(), "t.db");
+    return location;
+}
+
 // The bytes of a file, to see that it is unchanged.
 inline std::string FileBytes(const std::string& path)
 {
@@ -73,6 +81,18 @@ inline Strings ColumnValues(DACursor& cursor, const char* column)
         values.push_back(value);
     }
     return values;
+}
+
+// The cursor's names, then its values column by column.
+inline Strings Dump(DACursor& cursor)
+{
+    Strings out;
+    cursor.GetColumn(out);
+    for (const std::string& name : Strings(out)) {
+        const Strings values = ColumnValues(cursor, name.c_str());
+        out.insert(out.end(), values.begin(), values.end());
+    }
+    return out;
 }
 
 // The descriptors the process has open.

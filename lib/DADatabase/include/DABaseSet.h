@@ -4,11 +4,33 @@
 #include <cstdint>
 #include <map>
 #include <string>
+#include <type_traits>
+#include <vector>
 
 #include "DABasePath.h"
+#include "DAOwnedString.h"
 
 /// Column name (the caller's pointer, compared by address) to value text.
 using DAValueMap = std::map<char const*, std::string>;
+
+/// The comparison of a listed condition (DABaseSet::SetWhere with an
+/// operator): =, <>, <, <=, >, >= and LIKE.
+enum class DACompare { Equal, NotEqual, Less, LessEqual, Greater, GreaterEqual, Like };
+
+/// Whether Integer is an integer type that the int and std::int64_t
+/// overloads of DABaseSet do not take exactly: short, long, long long and
+/// the unsigned types, but not bool, the character types, int or
+/// std::int64_t (those keep the overloads they always picked).
+template <typename Integer>
+struct DAIsOtherInteger
+    : std::integral_constant<bool,
+                             std::is_integral<Integer>::value && !std::is_same<Integer, bool>::value &&
+                                 !std::is_same<Integer, char>::value && !std::is_same<Integer, signed char>::value &&
+                                 !std::is_same<Integer, unsigned char>::value &&
+                                 !std::is_same<Integer, wchar_t>::value && !std::is_same<Integer, char16_t>::value &&
+                                 !std::is_same<Integer, char32_t>::value && !std::is_same<Integer, int>::value &&
+                                 !std::is_same<Integer, std::int64_t>::value> {
+};
 
 /// A database location plus two value maps: the data map (values to write)
 /// and the where map (equality conditions). Base of the table requests and
@@ -55,14 +77,107 @@ public:
     void SetWhere(char const* column, std::int64_t value);
 
     ///@{
+    /// Every other integer type (short, long, long long, the unsigned ones,
+    /// so every fixed-width alias and std::size_t): its exact decimal text,
+    /// whatever the global locale ("18446744073709551615"), with the rules
+    /// of the std::int64_t setters.
+    template <typename Integer, std::enable_if_t<DAIsOtherInteger<Integer>::value, int> = 0>
+    void SetData(char const* column, Integer value)
+    {
+        SetInteger(Target::Data, column, DACompare::Equal, value);
+    }
+    template <typename Integer, std::enable_if_t<DAIsOtherInteger<Integer>::value, int> = 0>
+    void SetWhere(char const* column, Integer value)
+    {
+        SetInteger(Target::Where, column, DACompare::Equal, value);
+    }
+    ///@}
+
+    ///@{
+    /// Appends the condition "column op value" to the listed conditions,
+    /// kept in call order beside the where map (whose rules are untouched)
+    /// and written after its equalities, all joined by " AND ". Text is
+    /// written as a quoted literal; numbers unquoted, in the classic locale
+    /// (integers exactly, doubles as the shortest text that reads back
+    /// equal), so SQLite compares them as numbers. Takes the list's member
+    /// lock. The column is copied and must be a plain name (letters,
+    /// digits, '_', bytes from 0x80 up, no leading digit, optionally
+    /// "table.column"); otherwise nothing is stored and the error line
+    /// "INVALID COLUMN NAME, CONDITION NOT STORED" is logged. A null text
+    /// is refused with "NULL VALUE, CONDITION NOT STORED", a NaN or
+    /// infinite double with "INVALID NUMBER, CONDITION NOT STORED". Throws
+    /// nothing but std::bad_alloc (the list is then unchanged).
+    void SetWhere(char const* column, DACompare op, char const* value);
+    void SetWhere(char const* column, DACompare op, int value);
+    void SetWhere(char const* column, DACompare op, std::int64_t value);
+    void SetWhere(char const* column, DACompare op, double value);
+    template <typename Integer, std::enable_if_t<DAIsOtherInteger<Integer>::value, int> = 0>
+    void SetWhere(char const* column, DACompare op, Integer value)
+    {
+        SetInteger(Target::Condition, column, op, value);
+    }
+    ///@}
+
+    /// Appends "column IN ('a', 'b')" (values as quoted literals, "IN ()"
+    /// for none) to the listed conditions, with the rules above.
+    void SetWhereIn(char const* column, std::vector<std::string> const& values);
+
+    /// Appends "column IS NULL", or "column IS NOT NULL" when isNull is
+    /// false, to the listed conditions, with the rules above.
+    void SetWhereNull(char const* column, bool isNull = true);
+
+    /// One listed condition, as the generator writes it.
+    struct Condition {
+        /// What the condition tests.
+        enum class Form { Compare, In, Null, NotNull };
+        std::string column;  ///< the plain column name
+        Form form = Form::Compare;  ///< the kind of condition
+        DACompare op = DACompare::Equal;  ///< the comparison, for Form::Compare
+        std::vector<std::string> values;  ///< one value to compare with, or the IN list
+        bool number = false;  ///< the one value is a number, written unquoted
+    };
+
+    /// Replaces out by a copy of the listed conditions in call order.
+    void GetConditions(std::vector<Condition>& out);
+
+    ///@{
     /// Replace out by a copy of the data map / where map.
     void GetDataMap(DAValueMap& out);
     void GetWhereMap(DAValueMap& out);
     ///@}
 
 private:
+    // Which setter family an integer of another type came through.
+    enum class Target { Data, Where, Condition };
+
+    template <typename Integer>
+    void SetInteger(Target target, char const* column, DACompare op, Integer value)
+    {
+        if constexpr (std::is_signed<Integer>::value) {
+            SetWide(target, column, op, static_cast<std::int64_t>(value));
+        } else {
+            SetWide(target, column, op, static_cast<std::uint64_t>(value));
+        }
+    }
+    void SetWide(Target target, char const* column, DACompare op, std::int64_t value);
+    void SetWide(Target target, char const* column, DACompare op, std::uint64_t value);
+
+    // Stores a listed condition whose column the caller checked.
+    void AddCondition(char const* column, Condition::Form form, DACompare op, std::vector<std::string> values,
+                      bool number, const char* func);
+
+    // A listed condition with its column owned by the request.
+    struct StoredCondition {
+        DAOwnedString column;
+        Condition::Form form;
+        DACompare op;
+        std::vector<std::string> values;
+        bool number;
+    };
+
     DAValueMap m_dataMap;
     DAValueMap m_whereMap;
+    std::vector<StoredCondition> m_conditions;
 };
 
 #endif  // DABASESET_H

@@ -4,12 +4,17 @@
 #include <string>
 #include <vector>
 
+#include "DAAddColumnRequest.h"
 #include "DABasePath.h"
+#include "DACreateIndexRequest.h"
 #include "DACreateRequest.h"
 #include "DADeleteRequest.h"
 #include "DADropRequest.h"
+#include "DAInsertRequest.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
+
+struct DAOperations;
 
 /// Many write statements for one database file, which
 /// DADatabase::ExecuteBatch runs in one transaction on one connection:
@@ -54,6 +59,15 @@ public:
     int Add(DADropRequest& request);
     ///@}
 
+    ///@{
+    /// Writes the request's statement as CreateIndex or AddColumn would;
+    /// the same returns and location rule.
+    int Add(DACreateIndexRequest& request);
+    int Add(DAAddColumnRequest& request);
+    ///@}
+    /// Writes the request's statement as Insert would, with Add's rules.
+    int Add(DAInsertRequest& request);
+
     /// The number of statements held.
     int GetCount() const { return m_count; }
 
@@ -67,7 +81,9 @@ public:
     int GetChanges() const { return m_changes; }
 
 private:
-    friend class DADatabase;
+    // The operation that runs the batch reads the texts and sets the change
+    // count.
+    friend struct DAOperations;
 
     template <typename Request, typename Generate>
     int AddStatement(Request& request, Generate generate);
@@ -81,10 +97,7 @@ private:
     int m_count = 0;
     int m_changes = 0;
     // Add's scratch for comparing locations.
-    std::string m_requestDir;
-    std::string m_requestFile;
-    std::string m_ownDir;
-    std::string m_ownFile;
+    std::string m_scratch[4];
 };
 
 #endif  // DABATCHREQUEST_H

@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <map>
 #include <string>
+#include <type_traits>
 #include <vector>
 
 /// The whole result of a query, held as text column by column, with a
@@ -89,6 +90,20 @@ public:
     /// ERROR!!!"), value untouched on failure. Reads back what
     /// DABaseSet::SetData(column, std::int64_t) stored.
     int GetInt64(const char* column, std::int64_t& value);
+    /// GetInt64 into a long long where that is not std::int64_t (x86_64,
+    /// whose std::int64_t is long): the same checks, codes and lines.
+    template <typename LongLong,
+              std::enable_if_t<std::is_same<LongLong, long long>::value && !std::is_same<LongLong, std::int64_t>::value,
+                               int> = 0>
+    int GetInt64(const char* column, LongLong& value)
+    {
+        std::int64_t read = 0;
+        const int rc = GetInt64(column, read);
+        if (rc == 0) {
+            value = read;
+        }
+        return rc;
+    }
 
 private:
     /// The value of column in the current row, or null after logging the

@@ -1,16 +1,20 @@
 #ifndef DADATABASE_H
 #define DADATABASE_H
 
+#include <cstdint>
 #include <string>
 
 #include <sqlite3.h>
 
+#include "DAAddColumnRequest.h"
 #include "DABasePath.h"
 #include "DABatchRequest.h"
+#include "DACreateIndexRequest.h"
 #include "DACreateRequest.h"
 #include "DACursor.h"
 #include "DADeleteRequest.h"
 #include "DADropRequest.h"
+#include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
 #include "DASelectRequest.h"
@@ -78,9 +82,10 @@ public:
     /// Queries. Return the open's code if it failed, else the preparation's
     /// code; step failures are logged by the parser but not returned. When
     /// the open or the preparation fails, cursor / exists are left as they
-    /// were and the failure line is "SELECT FAILED[rc]: text",
-    /// "JoinSelect FAILED[rc]: text" or "CheckExistTable FAILED[rc]: text".
-    /// Select also logs "OpenDB Error: rc" (info) when the open fails.
+    /// were. A failed open writes only OpenDB's line (for Select followed by
+    /// "OpenDB Error: rc", info); a failed preparation writes "SELECT
+    /// FAILED[rc]: text", "JoinSelect FAILED[rc]: text" or "CheckExistTable
+    /// FAILED[rc]: text".
     int Select(DASelectRequest& request, DACursor& cursor);
     int JoinSelect(DAJoinRequest& request, DACursor& cursor);
     ///@}
@@ -89,12 +94,86 @@ public:
     /// the same codes, cursor handling and lines, under the function name
     /// "Query": "OpenDB Error: rc" (info) when the open fails, "QUERY
     /// FAILED[rc]: text" when the preparation fails. A page past the last
-    /// row returns 0 with an emptied cursor (GetCount() -1).
+    /// row returns 0 with an emptied cursor (GetCount() -1). Unlike Select,
+    /// a failed step is returned: 11 for a damaged page, 26, 5 once the
+    /// busy limit is reached while stepping, after the parser's line and
+    /// "QUERY FAILED[rc]: SQLite's text"; the rows read before it stay in
+    /// the cursor.
     int Query(DAQueryRequest& request, DACursor& cursor);
 
     /// exists: whether a table named exactly tableName exists. A null
     /// tableName throws std::logic_error (the connection is closed first).
     int CheckExistTable(DABasePath& location, char const* tableName, bool& exists);
+
+    ///@{
+    /// Schema writes, in the frame of the writes above: CreateIndex
+    /// (DASqlGenerator::GetCreateIndexSql; an index of that name already
+    /// there is left as it is) and AddColumn (GetAddColumnSql; a column that
+    /// exists fails with 1, "duplicate column name: c"). Lines "CreateIndex
+    /// SUCCESS[0]" / "CreateIndex FAILED[rc]: text", "AddColumn SUCCESS[0]"
+    /// / "AddColumn FAILED[rc]: text".
+    int CreateIndex(DACreateIndexRequest& request);
+    int AddColumn(DAAddColumnRequest& request);
+    ///@}
+
+    /// version: the schema version of location's file (SQLite's
+    /// user_version; 0 for a new file, which is created). Returns the
+    /// open's code (with OpenDB's lines), else the read's, logging
+    /// "GetVersion FAILED[rc]: text"; version is untouched unless 0 is
+    /// returned. Logs nothing on success.
+    int GetVersion(DABasePath& location, int& version);
+
+    /// Brings the file at step's location from version - 1 to version by
+    /// running step's statements, once per file however many processes and
+    /// threads migrate it at once. On one connection: reads the file's
+    /// version V without taking the write lock; when V is version - 1 it
+    /// takes the write lock ("BEGIN IMMEDIATE", busy-retry as ExecuteBatch)
+    /// and reads V again, and only that reading decides:
+    /// - V = version - 1: runs the statements in Add order, sets the
+    ///   version, commits; logs "Migrate SUCCESS[0]: version N" (info),
+    ///   returns 0. An empty step only sets the version.
+    /// - V >= version: changes nothing, logs "Migrate SKIPPED: file at
+    ///   version V" (info), returns 0.
+    /// - V < version - 1: changes nothing, logs "Migrate FAILED[21]: file at
+    ///   version V, step for version N" (error), returns 21.
+    /// A failing statement (or commit) rolls everything back, the version
+    /// stays V, and it logs "Migrate FAILED[rc] at i/n: text" as
+    /// ExecuteBatch does and returns rc; a process killed midway leaves the
+    /// file the same way. A version of 0 or less returns 21 with the line
+    /// "Migrate FAILED[21]: step for version N, versions start at 1",
+    /// nothing opened. An app calls Migrate once per step, in version
+    /// order, at every start.
+    int Migrate(DABatchRequest& step, int version);
+
+    /// The size of location's file and the part of it its free pages take,
+    /// in bytes (page count and free-list count times the page size).
+    /// Codes and lines as GetVersion ("GetSpace FAILED[rc]: text"); both
+    /// outputs untouched unless 0 is returned.
+    int GetSpace(DABasePath& location, std::int64_t& fileBytes, std::int64_t& freeBytes);
+
+    /// Rewrites location's file without its free pages ("VACUUM", under the
+    /// busy-retry rule), so it shrinks by about GetSpace's free bytes; every
+    /// row stays. Needs free space beside the file of up to twice its size
+    /// (a temporary copy, then the rollback journal) and every other
+    /// connection to be idle. When the space is missing it returns 13
+    /// (SQLITE_FULL) and the file stays as it was. Lines "Compact
+    /// SUCCESS[0]" / "Compact FAILED[rc]: text".
+    int Compact(DABasePath& location);
+
+    /// Inserts one row (DASqlGenerator::GetInsertSql) in the frame of the
+    /// writes, with the lines "Insert SUCCESS[0]" and "Insert FAILED[rc]:
+    /// text". On 0, rowId is the new row's id, or -1 when the row was
+    /// ignored (SetIgnoreExisting); on failure it is untouched. A key
+    /// clash without ignoring fails with 19 and SQLite's text.
+    int Insert(DAInsertRequest& request, std::int64_t& rowId);
+
+    ///@{
+    /// The one-argument Update and Delete, codes and lines included; on 0,
+    /// changes is the number of rows the statement changed, on failure it
+    /// is untouched.
+    int Update(DAUpdateRequest& request, int& changes);
+    int Delete(DADeleteRequest& request, int& changes);
+    ///@}
 };
 
 #endif  // DADATABASE_H

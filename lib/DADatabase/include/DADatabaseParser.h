@@ -1,6 +1,8 @@
 #ifndef DADATABASEPARSER_H
 #define DADATABASEPARSER_H
 
+#include <string>
+
 #include <sqlite3.h>
 
 #include "DACursor.h"
@@ -33,6 +35,15 @@ public:
     /// only for the error text of a failed step. Rows read before a failure
     /// stay.
     void ParseDatabase(sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor);
+
+    /// ParseDatabase, lines included (they name ParseDatabase), that also
+    /// tells how the rows ended: returns 101 (SQLITE_DONE) when every row
+    /// was read; otherwise the failure's code, as SQLite reports it for the
+    /// failed step (11 for a damaged page, not the generic 1 a statement
+    /// from sqlite3_prepare steps into), or 5 when the busy limit ended the
+    /// loop, with SQLite's text of it in failure. failure is untouched on
+    /// SQLITE_DONE.
+    int ParseRows(sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor, std::string& failure);
 };
 
 #endif  // DADATABASEPARSER_H

@@ -3,9 +3,13 @@
 
 #include <string>
 
+#include "DAAddColumnRequest.h"
+#include "DABasePath.h"
+#include "DACreateIndexRequest.h"
 #include "DACreateRequest.h"
 #include "DADeleteRequest.h"
 #include "DADropRequest.h"
+#include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
 #include "DASelectRequest.h"
@@ -21,6 +25,12 @@
 /// the table name of the existence statement, are written as SQL text
 /// literals with any single quote doubled, so every text round-trips.
 /// Incomplete requests still produce text (which SQLite then rejects).
+///
+/// Conditions: the where map's equalities ("a='1'", map order), then the
+/// listed conditions in call order ("ts<1700000000000", "name LIKE 'K%'",
+/// "k IN ('a', 'b')", "v IS NULL"; numbers unquoted), joined by " AND "
+/// after " WHERE "; written the same way by every statement that takes
+/// conditions, and left out when there is none (but by the update).
 class DASqlGenerator {
 public:
     DASqlGenerator() = default;
@@ -45,7 +55,10 @@ public:
     /// "SELECT * FROM t[ WHERE a='1' AND b='2']"
     void GetSelectSql(DASelectRequest& request, std::string& sql);
 
-    /// GetSelectSql's text for the same table and conditions, then
+    /// GetSelectSql's text for the same table and conditions (with the
+    /// select list, when one is set, in place of "*": "SELECT type,
+    /// COUNT(*) AS n FROM ..."), then " GROUP BY a, b" when groups are set,
+    /// then
     /// " ORDER BY a, b DESC" when sort keys are set, then " LIMIT n OFFSET m"
     /// when a page is set (" LIMIT n" when the offset is 0; n is -1 when only
     /// an offset is given, and nothing is added for no limit and no offset).
@@ -62,6 +75,20 @@ public:
 
     /// "DELETE  FROM t[ WHERE c='3']"
     void GetDeleteSql(DADeleteRequest& request, std::string& sql);
+
+    /// "CREATE INDEX IF NOT EXISTS i ON t (a DESC, b)", "CREATE UNIQUE INDEX
+    /// IF NOT EXISTS ..." when unique; columns in AddColumn order.
+    void GetCreateIndexSql(DACreateIndexRequest& request, std::string& sql);
+
+    /// "ALTER TABLE t ADD COLUMN c TYPE", then " DEFAULT 'v'" when a default
+    /// is set.
+    void GetAddColumnSql(DAAddColumnRequest& request, std::string& sql);
+
+    /// "VACUUM": rewrites location's file without its free pages.
+    void GetCompactSql(DABasePath& location, std::string& sql);
+    /// "INSERT INTO t (a, b) VALUES ('1', '2')" (GetUpsertSql's shape), or
+    /// "INSERT OR IGNORE INTO ..." when the request ignores existing rows.
+    void GetInsertSql(DAInsertRequest& request, std::string& sql);
 };
 
 #endif  // DASQLGENERATOR_H

@@ -1,108 +1,37 @@
 #include "DADatabase.h"
 
-#include <cstring>
-#include <stdexcept>
-
 #include "DABusyRetry.h"
-#include "DADatabaseParser.h"
 #include "DALog.h"
+#include "DAOperation.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
 
 namespace {
 
-// Opens the location of request, or returns the open's code with db null.
-int OpenLocation(DADatabase& database, DABasePath& location, DAConnection& db)
-{
-    std::string dir;
-    std::string file;
-    location.GetPath(dir, file);
-    sqlite3* handle = nullptr;
-    const int rc = database.OpenDB(handle, dir, file);
-    db.reset(handle);
-    return rc;
-}
+// A per-call visit: every operation opens its request's file and closes it
+// when done.
+class DAVisit : public DAConnectionSource {
+public:
+    explicit DAVisit(DADatabase& database) : DAConnectionSource(DA_FILE_NAME), m_database(database) {}
 
-// sqlite3_exec of sql under busy-retry; error holds the text of the last
-// attempt (the text of a busy attempt is released before the next).
-int ExecWhileBusy(DADatabase& database, sqlite3* db, const char* sql, DAErrorText& error)
-{
-    return DARetryWhileBusy(database, [&] {
-        error.reset();
-        char* text = nullptr;
-        const int result = sqlite3_exec(db, sql, nullptr, nullptr, &text);
-        error.reset(text);
-        return result;
-    });
-}
-
-// The text of a failed exec: sqlite3_exec gives none when it runs out of
-// memory.
-const char* FailureText(const DAErrorText& error, int rc)
-{
-    return error != nullptr ? error.get() : sqlite3_errstr(rc);
-}
-
-// The frame every write operation shares: open, generate, execute under
-// busy-retry, log "<word> SUCCESS[0]" or "<word> FAILED[rc]: text" under
-// func, release, return the code.
-template <typename Request>
-int Execute(DADatabase& database, Request& request, void (DASqlGenerator::*generate)(Request&, std::string&),
-            const char* func, const char* word)
-{
-    DAConnection db;
-    int rc = OpenLocation(database, request, db);
-    if (rc != SQLITE_OK) {
+    int Acquire(DABasePath& location, DAAccess /*access*/, const char* /*func*/, DALease& lease) override
+    {
+        std::string dir;
+        std::string file;
+        location.GetPath(dir, file);
+        sqlite3* handle = nullptr;
+        const int rc = m_database.OpenDB(handle, dir, file);
+        lease = DALease(handle, DALeaseEnd{this});  // null when the open failed
         return rc;
     }
-    std::string sql;
-    DASqlGenerator generator;
-    (generator.*generate)(request, sql);
 
-    DAErrorText error;
-    rc = ExecWhileBusy(database, db.get(), sql.c_str(), error);
-    if (rc == SQLITE_OK) {
-        DA_LOG_AT(DLOG_INFO, func, "%s SUCCESS[%d]", word, rc);
-    } else {
-        DA_LOG_AT(DLOG_ERROR, func, "%s FAILED[%d]: %s", word, rc, FailureText(error, rc));
-    }
-    return rc;
-}
+    void Release(sqlite3* db) noexcept override { sqlite3_close(db); }
 
-// The frame the queries share: open, generate, prepare under busy-retry,
-// and parse the statement on success; on failure log "<word> FAILED[rc]:
-// text" under func. Returns the open's code if it failed, else the
-// preparation's.
-template <typename Generate, typename Parse>
-int Query(DADatabase& database, DABasePath& location, Generate generate, Parse parse, const char* func,
-          const char* word, bool logOpenFailure)
-{
-    DAConnection db;
-    const int openRc = OpenLocation(database, location, db);
-    if (openRc != SQLITE_OK) {
-        if (logOpenFailure) {
-            DA_LOG_AT(DLOG_INFO, func, "OpenDB Error: %d", openRc);
-        }
-        return openRc;
-    }
-    std::string sql;
-    generate(sql);
+    bool IsRetryLimit(int& count) override { return m_database.IsRetryLimit(count); }
 
-    DAStatement stmt;
-    const int rc = DARetryWhileBusy(database, [&] {
-        sqlite3_stmt* handle = nullptr;
-        const int result = sqlite3_prepare(db.get(), sql.c_str(), -1, &handle, nullptr);
-        stmt.reset(handle);
-        return result;
-    });
-    if (rc != SQLITE_OK) {
-        DA_LOG_AT(DLOG_ERROR, func, "%s FAILED[%d]: %s", word, rc, sqlite3_errmsg(db.get()));
-        return rc;
-    }
-    DADatabaseParser parser;
-    parse(parser, db.get(), stmt.get());
-    return rc;
-}
+private:
+    DADatabase& m_database;
+};
 
 }  // namespace
 
@@ -135,108 +64,114 @@ bool DADatabase::IsRetryLimit(int& count)
 
 int DADatabase::DropTable(DADropRequest& request)
 {
-    return Execute(*this, request, &DASqlGenerator::GetDropTableSql, __func__, "DropTable");
+    DAVisit visit(*this);
+    return DAOperations::DropTable(visit, request);
 }
 
 int DADatabase::Update(DAUpdateRequest& request)
 {
-    return Execute(*this, request, &DASqlGenerator::GetUpdateSql, __func__, "update");
+    DAVisit visit(*this);
+    return DAOperations::Update(visit, request);
 }
 
 int DADatabase::Delete(DADeleteRequest& request)
 {
-    return Execute(*this, request, &DASqlGenerator::GetDeleteSql, __func__, "delete");
+    DAVisit visit(*this);
+    return DAOperations::Delete(visit, request);
 }
 
 int DADatabase::Upsert(DAUpsertRequest& request)
 {
-    return Execute(*this, request, &DASqlGenerator::GetUpsertSql, __func__, "Upsert");
+    DAVisit visit(*this);
+    return DAOperations::Upsert(visit, request);
 }
 
 int DADatabase::CreateTable(DACreateRequest& request)
 {
-    return Execute(*this, request, &DASqlGenerator::GetCreateTableSql, __func__, "createTable");
+    DAVisit visit(*this);
+    return DAOperations::CreateTable(visit, request);
 }
 
 int DADatabase::ExecuteBatch(DABatchRequest& batch)
 {
-    const int count = batch.m_count;
-    if (count == 0) {
-        return SQLITE_OK;
-    }
-    DAConnection db;
-    int rc = OpenLocation(*this, batch, db);
-    if (rc != SQLITE_OK) {
-        return rc;
-    }
-    // IMMEDIATE takes the write lock now, so a busy file shows (and is
-    // waited for) before any statement runs.
-    DAErrorText error;
-    int step = 0;  // 0 the begin, 1..count the statements, count + 1 the commit
-    rc = ExecWhileBusy(*this, db.get(), "BEGIN IMMEDIATE", error);
-    const int before = sqlite3_total_changes(db.get());
-    const char* sql = batch.m_texts.data();
-    while (rc == SQLITE_OK && step < count) {
-        ++step;
-        rc = ExecWhileBusy(*this, db.get(), sql, error);
-        sql += std::strlen(sql) + 1;
-    }
-    if (rc == SQLITE_OK) {
-        step = count + 1;
-        const int changes = sqlite3_total_changes(db.get()) - before;
-        rc = ExecWhileBusy(*this, db.get(), "COMMIT", error);
-        if (rc == SQLITE_OK) {
-            batch.m_changes = changes;
-            DA_LOG(DLOG_INFO, "ExecuteBatch SUCCESS[%d]: %d statements", rc, count);
-            return rc;
-        }
-    }
-    // Some failures end the transaction inside SQLite already.
-    if (sqlite3_get_autocommit(db.get()) == 0) {
-        sqlite3_exec(db.get(), "ROLLBACK", nullptr, nullptr, nullptr);
-    }
-    DA_LOG(DLOG_ERROR, "ExecuteBatch FAILED[%d] at %d/%d: %s", rc, step, count, FailureText(error, rc));
-    return rc;
+    DAVisit visit(*this);
+    return DAOperations::ExecuteBatch(visit, batch);
 }
 
-// The frame is called as ::Query: inside the class the name Query means
-// the member DADatabase::Query.
 int DADatabase::Select(DASelectRequest& request, DACursor& cursor)
 {
-    return ::Query(
-        *this, request, [&](std::string& sql) { DASqlGenerator().GetSelectSql(request, sql); },
-        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
-        __func__, "SELECT", true);
+    DAVisit visit(*this);
+    return DAOperations::Select(visit, request, cursor);
 }
 
 int DADatabase::JoinSelect(DAJoinRequest& request, DACursor& cursor)
 {
-    return ::Query(
-        *this, request, [&](std::string& sql) { DASqlGenerator().GetJoinSql(request, sql); },
-        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
-        __func__, "JoinSelect", false);
+    DAVisit visit(*this);
+    return DAOperations::JoinSelect(visit, request, cursor);
 }
 
 int DADatabase::Query(DAQueryRequest& request, DACursor& cursor)
 {
-    return ::Query(
-        *this, request, [&](std::string& sql) { DASqlGenerator().GetQuerySql(request, sql); },
-        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) { parser.ParseDatabase(db, stmt, cursor); },
-        __func__, "QUERY", true);
+    DAVisit visit(*this);
+    return DAOperations::Query(visit, request, cursor);
 }
 
 int DADatabase::CheckExistTable(DABasePath& location, char const* tableName, bool& exists)
 {
-    return ::Query(
-        *this, location,
-        [&](std::string& sql) {
-            // Thrown explicitly (a std::string from null is undefined); the
-            // connection owner closes the file on the way out.
-            if (tableName == nullptr) {
-                throw std::logic_error("DADatabase::CheckExistTable: the table name is null");
-            }
-            DASqlGenerator().GetCheckTableSql(tableName, sql);
-        },
-        [&](DADatabaseParser& parser, sqlite3* /*db*/, sqlite3_stmt* stmt) { parser.ParseExistTable(stmt, exists); },
-        __func__, "CheckExistTable", false);
+    DAVisit visit(*this);
+    return DAOperations::CheckExistTable(visit, location, tableName, exists);
+}
+
+int DADatabase::CreateIndex(DACreateIndexRequest& request)
+{
+    DAVisit visit(*this);
+    return DAOperations::CreateIndex(visit, request);
+}
+
+int DADatabase::AddColumn(DAAddColumnRequest& request)
+{
+    DAVisit visit(*this);
+    return DAOperations::AddColumn(visit, request);
+}
+
+int DADatabase::GetVersion(DABasePath& location, int& version)
+{
+    DAVisit visit(*this);
+    return DAOperations::GetVersion(visit, location, version);
+}
+
+int DADatabase::Migrate(DABatchRequest& step, int version)
+{
+    DAVisit visit(*this);
+    return DAOperations::Migrate(visit, step, version);
+}
+
+int DADatabase::GetSpace(DABasePath& location, std::int64_t& fileBytes, std::int64_t& freeBytes)
+{
+    DAVisit visit(*this);
+    return DAOperations::GetSpace(visit, location, fileBytes, freeBytes);
+}
+
+int DADatabase::Compact(DABasePath& location)
+{
+    DAVisit visit(*this);
+    return DAOperations::Compact(visit, location);
+}
+
+int DADatabase::Insert(DAInsertRequest& request, std::int64_t& rowId)
+{
+    DAVisit visit(*this);
+    return DAOperations::Insert(visit, request, rowId);
+}
+
+int DADatabase::Update(DAUpdateRequest& request, int& changes)
+{
+    DAVisit visit(*this);
+    return DAOperations::Update(visit, request, changes);
+}
+
+int DADatabase::Delete(DADeleteRequest& request, int& changes)
+{
+    DAVisit visit(*this);
+    return DAOperations::Delete(visit, request, changes);
 }

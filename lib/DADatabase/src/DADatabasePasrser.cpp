@@ -57,10 +57,18 @@ int DADatabaseParser::ParseExistTable(sqlite3_stmt* stmt, bool& exists)
 
 void DADatabaseParser::ParseDatabase(sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor)
 {
+    std::string failure;
+    ParseRows(db, stmt, cursor, failure);
+}
+
+int DADatabaseParser::ParseRows(sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor, std::string& failure)
+{
+    const char* const func = "ParseDatabase";
     cursor.Initialize();
     DABusyRetry<DADatabaseParser> retry(*this);
     bool registered = false;
     int columnCount = 0;
+    int failed = SQLITE_OK;  // the failed step's code, once known
     // The column names, copied once from the first row: SQLite's name of a
     // column does not change while a statement prepared by sqlite3_prepare
     // runs, and asking for it again for every value costs a lock of the
@@ -68,14 +76,26 @@ void DADatabaseParser::ParseDatabase(sqlite3* db, sqlite3_stmt* stmt, DACursor& 
     std::vector<std::string> names;
     for (;;) {
         const int rc = sqlite3_step(stmt);
+        if (rc == SQLITE_DONE && failed == SQLITE_OK) {
+            return rc;
+        }
         if (rc == SQLITE_DONE || retry.Stopped()) {
-            return;
+            if (failed == SQLITE_OK) {  // the busy limit ended the loop
+                failed = SQLITE_BUSY;
+                failure = sqlite3_errstr(failed);
+            }
+            return failed;
         }
         if (retry.ShouldRetry(rc)) {
             continue;
         }
         if (rc != SQLITE_ROW) {
-            DA_LOG(DLOG_ERROR, "SQLITE STEP ERROR!!! %s", sqlite3_errmsg(db));
+            DA_LOG_AT(DLOG_ERROR, func, "SQLITE STEP ERROR!!! %s", sqlite3_errmsg(db));
+            // A statement from sqlite3_prepare steps into the generic 1;
+            // the reset gives the step's own code and text.
+            const int specific = sqlite3_reset(stmt);
+            failed = specific != SQLITE_OK ? specific : rc;
+            failure = specific != SQLITE_OK ? sqlite3_errmsg(db) : sqlite3_errstr(rc);
             retry.Stop();
             continue;
         }
@@ -100,7 +120,7 @@ void DADatabaseParser::ParseDatabase(sqlite3* db, sqlite3_stmt* stmt, DACursor& 
                 cursor.SetData(name, "");
                 break;
             default:
-                DA_LOG(DLOG_ERROR, "UNKNOWN TYPE");
+                DA_LOG_AT(DLOG_ERROR, func, "UNKNOWN TYPE");
                 cursor.SetData(name, "");
                 break;
             }

@@ -1,6 +1,7 @@
 #include "DASqlGenerator.h"
 
 #include <utility>
+#include <vector>
 
 namespace {
 
@@ -28,10 +29,55 @@ void AppendLiteral(std::string& sql, const std::string& value)
     sql += '\'';
 }
 
-// Appends " WHERE a='1' AND b='2'" in map order, then cuts at the last
-// " AND" of the whole text (so an empty map leaves " WHERE ").
-void AppendWhere(std::string& sql, const DAValueMap& conditions)
+// Appends one listed condition: "ts<1700000000000", "k IN ('a', 'b')",
+// "v IS NULL".
+void AppendCondition(std::string& sql, const DABaseSet::Condition& condition)
 {
+    static const char* const kOperators[] = {"=", "<>", "<", "<=", ">", ">=", " LIKE "};
+    sql += condition.column;
+    switch (condition.form) {
+    case DABaseSet::Condition::Form::Compare:
+        sql += kOperators[static_cast<int>(condition.op)];
+        if (condition.number) {
+            sql += condition.values.front();
+        } else {
+            AppendLiteral(sql, condition.values.front());
+        }
+        break;
+    case DABaseSet::Condition::Form::In:
+        sql += " IN (";
+        for (const std::string& value : condition.values) {
+            AppendLiteral(sql, value);
+            sql += ", ";
+        }
+        if (!condition.values.empty()) {
+            sql.resize(sql.size() - 2);
+        }
+        sql += ')';
+        break;
+    case DABaseSet::Condition::Form::Null:
+        sql += " IS NULL";
+        break;
+    case DABaseSet::Condition::Form::NotNull:
+        sql += " IS NOT NULL";
+        break;
+    }
+}
+
+// The one WHERE builder: " WHERE " with the equalities in map order, then
+// the listed conditions in call order, joined by " AND "; then a cut at the
+// last " AND" of the whole text. Without any condition nothing is written,
+// unless always (the update's shape), which writes " WHERE " and cuts as
+// ever.
+void AppendWhere(std::string& sql, DABaseSet& request, bool always)
+{
+    DAValueMap conditions;
+    std::vector<DABaseSet::Condition> listed;
+    request.GetWhereMap(conditions);
+    request.GetConditions(listed);
+    if (conditions.empty() && listed.empty() && !always) {
+        return;
+    }
     sql += " WHERE ";
     for (const auto& condition : conditions) {
         sql += condition.first;
@@ -39,7 +85,37 @@ void AppendWhere(std::string& sql, const DAValueMap& conditions)
         AppendLiteral(sql, condition.second);
         sql += " AND ";
     }
+    for (const auto& condition : listed) {
+        AppendCondition(sql, condition);
+        sql += " AND ";
+    }
     CutAtLast(sql, " AND");
+}
+
+// "<head>t (a, b) VALUES ('1', '2')", the data map in map order: the
+// insert statements' shared shape.
+void WriteInsert(const char* head, DABaseSet& request, const std::string& table, std::string& sql)
+{
+    DAValueMap data;
+    request.GetDataMap(data);
+
+    std::string columns = " (";
+    std::string values = "VALUES (";
+    for (const auto& entry : data) {
+        columns += entry.first;
+        columns += ", ";
+        AppendLiteral(values, entry.second);
+        values += ", ";
+    }
+    CutAtLast(columns, ", ");
+    columns += ") ";
+    CutAtLast(values, ", ");
+    values += ')';
+    // Built in one buffer of the final size: batches write many of these.
+    std::string text;
+    text.reserve(std::char_traits<char>::length(head) + table.size() + columns.size() + values.size());
+    text.append(head).append(table).append(columns).append(values);
+    sql = std::move(text);
 }
 
 }  // namespace
@@ -114,14 +190,10 @@ void DASqlGenerator::GetCreateTableSql(DACreateRequest& request, std::string& sq
 void DASqlGenerator::GetSelectSql(DASelectRequest& request, std::string& sql)
 {
     std::string table;
-    DAValueMap conditions;
     request.GetTable(table);
-    request.GetWhereMap(conditions);
 
     std::string text = "SELECT * FROM " + table;
-    if (!conditions.empty()) {
-        AppendWhere(text, conditions);
-    }
+    AppendWhere(text, request, false);
     sql = std::move(text);
 }
 
@@ -133,8 +205,40 @@ void DASqlGenerator::GetQuerySql(DAQueryRequest& request, std::string& sql)
     request.GetOrderBy(keys);
     request.GetLimit(count, offset);
 
+    std::vector<DAQueryRequest::SelectItem> items;
+    std::vector<std::string> groups;
+    request.GetColumns(items);
+    request.GetGroupBy(groups);
+
     std::string text;
-    GetSelectSql(request, text);
+    if (items.empty()) {
+        GetSelectSql(request, text);
+    } else {
+        static const char* const kFunctions[] = {"COUNT(", "MIN(", "MAX(", "SUM(", "AVG("};
+        std::string table;
+        request.GetTable(table);
+        text = "SELECT ";
+        for (const auto& item : items) {
+            if (item.aggregate) {
+                text += kFunctions[static_cast<int>(item.function)];
+                text += item.column.empty() ? "*" : item.column;
+                text += ") AS " + item.as;
+            } else {
+                text += item.column;
+            }
+            text += ", ";
+        }
+        text.resize(text.size() - 2);
+        text += " FROM " + table;
+        AppendWhere(text, request, false);
+    }
+    if (!groups.empty()) {
+        text += " GROUP BY ";
+        for (const auto& group : groups) {
+            text += group + ", ";
+        }
+        text.resize(text.size() - 2);
+    }
     if (!keys.empty()) {
         text += " ORDER BY ";
         for (const auto& key : keys) {
@@ -158,54 +262,28 @@ void DASqlGenerator::GetJoinSql(DAJoinRequest& request, std::string& sql)
     std::string leftColumn;
     std::string rightTable;
     std::string rightColumn;
-    DAValueMap conditions;
     request.GetLeftJoin(leftTable, leftColumn);
     request.GetRightJoin(rightTable, rightColumn);
-    request.GetWhereMap(conditions);
 
     std::string text = "SELECT  * FROM " + leftTable + " INNER JOIN " + rightTable + " ON " + leftTable + "." +
         leftColumn + " = " + rightTable + "." + rightColumn;
-    if (!conditions.empty()) {
-        AppendWhere(text, conditions);
-    }
+    AppendWhere(text, request, false);
     sql = std::move(text);
 }
 
 void DASqlGenerator::GetUpsertSql(DAUpsertRequest& request, std::string& sql)
 {
     std::string table;
-    DAValueMap data;
     request.GetTable(table);
-    request.GetDataMap(data);
-
-    std::string columns = " (";
-    std::string values = "VALUES (";
-    for (const auto& entry : data) {
-        columns += entry.first;
-        columns += ", ";
-        AppendLiteral(values, entry.second);
-        values += ", ";
-    }
-    CutAtLast(columns, ", ");
-    columns += ") ";
-    CutAtLast(values, ", ");
-    values += ')';
-    // Built in one buffer of the final size: batches write many of these.
-    const char* const head = "INSERT OR REPLACE INTO ";
-    std::string text;
-    text.reserve(std::char_traits<char>::length(head) + table.size() + columns.size() + values.size());
-    text.append(head).append(table).append(columns).append(values);
-    sql = std::move(text);
+    WriteInsert("INSERT OR REPLACE INTO ", request, table, sql);
 }
 
 void DASqlGenerator::GetUpdateSql(DAUpdateRequest& request, std::string& sql)
 {
     std::string table;
     DAValueMap data;
-    DAValueMap conditions;
     request.GetTable(table);
     request.GetDataMap(data);
-    request.GetWhereMap(conditions);
 
     std::string text = "UPDATE " + table + " SET ";
     for (const auto& entry : data) {
@@ -215,20 +293,65 @@ void DASqlGenerator::GetUpdateSql(DAUpdateRequest& request, std::string& sql)
         text += ", ";
     }
     CutAtLast(text, ", ");
-    AppendWhere(text, conditions);
+    AppendWhere(text, request, true);
     sql = std::move(text);
 }
 
 void DASqlGenerator::GetDeleteSql(DADeleteRequest& request, std::string& sql)
 {
     std::string table;
-    DAValueMap conditions;
     request.GetTable(table);
-    request.GetWhereMap(conditions);
 
     std::string text = "DELETE  FROM " + table;
-    if (!conditions.empty()) {
-        AppendWhere(text, conditions);
+    AppendWhere(text, request, false);
+    sql = std::move(text);
+}
+
+void DASqlGenerator::GetCreateIndexSql(DACreateIndexRequest& request, std::string& sql)
+{
+    std::string table;
+    std::string name;
+    DAIndexColumns columns;
+    request.GetTable(table);
+    request.GetName(name);
+    request.GetColumns(columns);
+
+    std::string text = request.IsUnique() ? "CREATE UNIQUE INDEX IF NOT EXISTS " : "CREATE INDEX IF NOT EXISTS ";
+    text += name + " ON " + table + " (";
+    for (const auto& column : columns) {
+        text += column.first;
+        text += column.second ? " DESC, " : ", ";
+    }
+    CutAtLast(text, ", ");
+    text += ')';
+    sql = std::move(text);
+}
+
+void DASqlGenerator::GetAddColumnSql(DAAddColumnRequest& request, std::string& sql)
+{
+    std::string table;
+    std::string column;
+    std::string type;
+    std::string value;
+    request.GetTable(table);
+    request.GetColumn(column, type);
+
+    std::string text = "ALTER TABLE " + table + " ADD COLUMN " + column + " " + type;
+    if (request.GetDefault(value)) {
+        text += " DEFAULT ";
+        AppendLiteral(text, value);
     }
     sql = std::move(text);
+}
+
+void DASqlGenerator::GetCompactSql(DABasePath& /*location*/, std::string& sql)
+{
+    sql = "VACUUM";
+}
+
+void DASqlGenerator::GetInsertSql(DAInsertRequest& request, std::string& sql)
+{
+    std::string table;
+    request.GetTable(table);
+    WriteInsert(request.GetIgnoreExisting() ? "INSERT OR IGNORE INTO " : "INSERT INTO ", request, table, sql);
 }

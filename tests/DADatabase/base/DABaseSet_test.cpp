@@ -1,6 +1,7 @@
 #include "DABaseSet.h"
 
 #include <chrono>
+#include <cmath>
 #include <future>
 #include <memory>
 #include <stdexcept>
@@ -70,6 +71,46 @@ TEST(DABaseSet, NullValueThrowsAndReleasesTheLock)
     ASSERT_EQ(done->get_future().wait_for(std::chrono::seconds(5)), std::future_status::ready)
         << "a map lock stayed held after the exception";
     EXPECT_EQ(MapsOf(set), std::make_pair(DAValueMap{{kName, "Kim"}}, DAValueMap{{kName, "Lee"}}));
+}
+
+}  // namespace
+
+namespace {
+
+// Names that could carry SQL, a null text, NaN and infinities are refused
+// with one line each and store nothing; quotes, "%n" and 10 MB values are
+// kept as given; names are copied at the call.
+TEST(DABaseSet, ListedConditionsRefuseWhatIsNotPlainAndCopyNames)
+{
+    DABaseSet set;
+    LogCapture log;
+    Strings expected;
+    for (const char* bad : {static_cast<const char*>(nullptr), "", "1ts", "ts;--", "a b", "a.b.c", "t.", "ts'"}) {
+        set.SetWhere(bad, DACompare::Less, 1);
+        set.SetWhereIn(bad, {});
+        set.SetWhereNull(bad);
+        for (const char* function : {"SetWhere", "SetWhereIn", "SetWhereNull"}) {
+            expected.push_back(Logged(6, "DABaseSet.cpp", function, "INVALID COLUMN NAME, CONDITION NOT STORED"));
+        }
+    }
+    set.SetWhere("v", DACompare::Equal, static_cast<const char*>(nullptr));
+    expected.push_back(Logged(6, "DABaseSet.cpp", "SetWhere", "NULL VALUE, CONDITION NOT STORED"));
+    for (const double number : {std::nan(""), HUGE_VAL, -HUGE_VAL}) {
+        set.SetWhere("v", DACompare::Equal, number);
+        expected.push_back(Logged(6, "DABaseSet.cpp", "SetWhere", "INVALID NUMBER, CONDITION NOT STORED"));
+    }
+    std::string name = "é_1.ts";
+    const std::string big(10 << 20, '\'');
+    set.SetWhere(name.c_str(), DACompare::Like, "%n%s'");
+    set.SetWhere("big", DACompare::Equal, big.c_str());
+    name = "overwritten";
+    std::vector<DABaseSet::Condition> listed;
+    set.GetConditions(listed);
+    ASSERT_EQ(2U, listed.size());
+    EXPECT_EQ("é_1.ts", listed[0].column);
+    EXPECT_EQ((std::vector<std::string>{"%n%s'"}), listed[0].values);
+    EXPECT_EQ(big, listed[1].values.at(0));
+    EXPECT_EQ(expected, Described(log));
 }
 
 }  // namespace

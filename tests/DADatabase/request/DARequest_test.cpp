@@ -9,6 +9,7 @@
 #include "DADropRequest.h"
 #include "DAJoinRequest.h"
 #include "DASelectRequest.h"
+#include "DASqlGenerator.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 #include "DatabaseTestUtil.h"
@@ -92,6 +93,32 @@ TEST(DACreateRequest, ColumnsKeepCallOrderNullsAreRefused)
     EXPECT_EQ(columns, (DAColumnList{{x, "TEXT"}, {y, "INTEGER"}, {x, ""}}));
     EXPECT_EQ(Strings{Logged(6, "DACreateRequest.cpp", "SetColumnKey", "NULL COLUMN NAME, COLUMN NOT ADDED")},
               Described(log));
+}
+
+// Schema requests keep only plain names: anything else (a space, a quote,
+// a leading digit, a qualified or empty name, null) is refused with one
+// line and leaves what was stored.
+TEST(SchemaRequests, KeepOnlyPlainNames)
+{
+    DACreateIndexRequest index;
+    DAAddColumnRequest add;
+    index.SetTable("events");
+    index.SetName("events_ts");
+    index.AddColumn("ts", true);
+    add.SetTable("events");
+    add.SetColumn("level", "INTEGER");
+    LogCapture log;
+    for (const char* name : {"ev ents", "ev'ents", "1st", "main.events", "", static_cast<const char*>(nullptr)}) {
+        index.SetTable(name), index.SetName(name), index.AddColumn(name);
+        add.SetTable(name), add.SetColumn(name, "TEXT"), add.SetColumn("ok", name);
+    }
+    std::string sql[2];
+    DASqlGenerator().GetCreateIndexSql(index, sql[0]);
+    DASqlGenerator().GetAddColumnSql(add, sql[1]);
+    EXPECT_EQ("CREATE INDEX IF NOT EXISTS events_ts ON events (ts DESC)", sql[0]);
+    EXPECT_EQ("ALTER TABLE events ADD COLUMN level INTEGER", sql[1]);
+    EXPECT_EQ(36U, log.Lines().size());
+    EXPECT_EQ(36, log.Count("INVALID NAME, NOT STORED"));
 }
 
 }  // namespace

@@ -2,6 +2,7 @@
 
 #include <array>
 #include <charconv>
+#include <cmath>
 #include <locale>
 #include <sstream>
 #include <stdexcept>
@@ -9,6 +10,7 @@
 
 #include "DALog.h"
 #include "DAMemberLock.h"
+#include "DAPlainName.h"
 
 namespace {
 
@@ -68,6 +70,46 @@ std::string ValueText(std::int64_t value)
     std::string text;
     CharsText(value, text);  // 32 characters always suffice
     return text;
+}
+
+std::string ValueText(std::uint64_t value)
+{
+    std::string text;
+    CharsText(value, text);
+    return text;
+}
+
+// A number in a listed condition: to_chars always, so the SQL never
+// depends on the global locale; a double as the shortest text that reads
+// back as the same double, so the comparison is exact.
+template <typename Integer>
+std::string NumberText(Integer value)
+{
+    std::string text;
+    CharsText(value, text);
+    return text;
+}
+
+std::string NumberText(double value)
+{
+    std::array<char, 32> text{};
+    const std::to_chars_result result = std::to_chars(text.data(), text.data() + text.size(), value);
+    return {text.data(), result.ptr};  // 24 characters at most
+}
+
+// The checks of every listed condition, in this order: a plain column
+// name, then a usable value (valueFailure names what is wrong with it).
+bool Accepted(char const* column, const char* valueFailure, const char* func)
+{
+    if (!DAIsPlainName(column, true)) {
+        DA_LOG_AT(DLOG_ERROR, func, "INVALID COLUMN NAME, CONDITION NOT STORED");
+        return false;
+    }
+    if (valueFailure != nullptr) {
+        DA_LOG_AT(DLOG_ERROR, func, "%s", valueFailure);
+        return false;
+    }
+    return true;
 }
 
 // The one insertion all the setters make: refuse a null column, then build
@@ -140,4 +182,88 @@ void DABaseSet::GetDataMap(DAValueMap& out)
 void DABaseSet::GetWhereMap(DAValueMap& out)
 {
     out = m_whereMap;
+}
+
+void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::int64_t value)
+{
+    if (target == Target::Data) {
+        Store(m_dataMap, column, value, "SetData");
+    } else if (target == Target::Where) {
+        Store(m_whereMap, column, value, "SetWhere");
+    } else {
+        SetWhere(column, op, value);
+    }
+}
+
+void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::uint64_t value)
+{
+    if (target == Target::Data) {
+        Store(m_dataMap, column, value, "SetData");
+    } else if (target == Target::Where) {
+        Store(m_whereMap, column, value, "SetWhere");
+    } else if (Accepted(column, nullptr, "SetWhere")) {
+        AddCondition(column, Condition::Form::Compare, op, {NumberText(value)}, true, "SetWhere");
+    }
+}
+
+void DABaseSet::AddCondition(char const* column, Condition::Form form, DACompare op, std::vector<std::string> values,
+                             bool number, const char* func)
+{
+    StoredCondition condition{DAOwnedString(), form, op, std::move(values), number};
+    condition.column.Assign(column);  // copied before the lock: a failed copy leaves the list as it was
+    const DAMemberLock lock(&m_conditions, DA_FILE_NAME, func, __LINE__);
+    m_conditions.push_back(std::move(condition));
+}
+
+void DABaseSet::SetWhere(char const* column, DACompare op, char const* value)
+{
+    if (Accepted(column, value == nullptr ? "NULL VALUE, CONDITION NOT STORED" : nullptr, __func__)) {
+        AddCondition(column, Condition::Form::Compare, op, {value}, false, __func__);
+    }
+}
+
+void DABaseSet::SetWhere(char const* column, DACompare op, int value)
+{
+    if (Accepted(column, nullptr, __func__)) {
+        AddCondition(column, Condition::Form::Compare, op, {NumberText(value)}, true, __func__);
+    }
+}
+
+void DABaseSet::SetWhere(char const* column, DACompare op, std::int64_t value)
+{
+    if (Accepted(column, nullptr, __func__)) {
+        AddCondition(column, Condition::Form::Compare, op, {NumberText(value)}, true, __func__);
+    }
+}
+
+void DABaseSet::SetWhere(char const* column, DACompare op, double value)
+{
+    if (Accepted(column, std::isfinite(value) ? nullptr : "INVALID NUMBER, CONDITION NOT STORED", __func__)) {
+        AddCondition(column, Condition::Form::Compare, op, {NumberText(value)}, true, __func__);
+    }
+}
+
+void DABaseSet::SetWhereIn(char const* column, std::vector<std::string> const& values)
+{
+    if (Accepted(column, nullptr, __func__)) {
+        AddCondition(column, Condition::Form::In, DACompare::Equal, values, false, __func__);
+    }
+}
+
+void DABaseSet::SetWhereNull(char const* column, bool isNull)
+{
+    if (Accepted(column, nullptr, __func__)) {
+        AddCondition(column, isNull ? Condition::Form::Null : Condition::Form::NotNull, DACompare::Equal, {}, false,
+                     __func__);
+    }
+}
+
+void DABaseSet::GetConditions(std::vector<Condition>& out)
+{
+    std::vector<Condition> copy;
+    copy.reserve(m_conditions.size());
+    for (const StoredCondition& stored : m_conditions) {
+        copy.push_back({stored.column.Get(), stored.form, stored.op, stored.values, stored.number});
+    }
+    out = std::move(copy);
 }

@@ -8,6 +8,9 @@
 #include <shared_mutex>
 #include <unordered_set>
 
+#include "DALog.h"
+#include "DAPlainName.h"
+
 namespace {
 
 // Hash and equality of NUL-terminated texts, so that a lookup needs no
@@ -56,6 +59,12 @@ Names& TheNames()
 char const* DAColumnName::Intern(char const* name)
 {
     if (name == nullptr) {
+        return nullptr;
+    }
+    // Checked here, where a name is made from data, so that no such name
+    // reaches a statement; the empty name carries no SQL and stays.
+    if (*name != '\0' && !DAIsPlainName(name, true)) {
+        DA_LOG(DLOG_ERROR, "INVALID COLUMN NAME, NOT INTERNED");
         return nullptr;
     }
     Names& names = TheNames();

@@ -5,49 +5,13 @@
 #include <algorithm>
 #include <string>
 
+#include "DALocationRule.h"
 #include "DALog.h"
 #include "DASqlGenerator.h"
 
-namespace {
-
-// The joined path of a location, or "(incomplete)" when a part is unset.
-std::string JoinedPath(DABasePath& location)
-{
-    if (!location.IsPathSet()) {
-        return "(incomplete)";
-    }
-    std::string dir;
-    std::string file;
-    std::string path;
-    location.GetPath(dir, file);
-    DASqlGenerator().GetDBPath(std::move(dir), std::move(file), path);
-    return path;
-}
-
-}  // namespace
-
 int DABatchRequest::CheckLocation(DABasePath& request)
 {
-    if (request.IsPathEmpty()) {
-        return SQLITE_OK;
-    }
-    if (request.IsPathSet() && IsPathSet()) {
-        // Equal parts name the same file: the usual case, compared in
-        // buffers that keep their capacity from one Add to the next.
-        request.GetPath(m_requestDir, m_requestFile);
-        GetPath(m_ownDir, m_ownFile);
-        if (m_requestDir == m_ownDir && m_requestFile == m_ownFile) {
-            return SQLITE_OK;
-        }
-    }
-    const std::string requested = JoinedPath(request);
-    const std::string own = JoinedPath(*this);
-    if (request.IsPathSet() && IsPathSet() && requested == own) {
-        return SQLITE_OK;
-    }
-    DA_LOG_AT(DLOG_ERROR, "Add", "Add FAILED[%d]: request location %s is not the batch's %s", SQLITE_MISUSE,
-              requested.c_str(), own.c_str());
-    return SQLITE_MISUSE;
+    return DACheckLocation(*this, request, DA_FILE_NAME, "Add", "batch", m_scratch);
 }
 
 template <typename Request, typename Generate>
@@ -102,4 +66,19 @@ void DABatchRequest::Clear()
 {
     std::vector<char>().swap(m_texts);
     m_count = 0;
+}
+
+int DABatchRequest::Add(DACreateIndexRequest& request)
+{
+    return AddStatement(request, &DASqlGenerator::GetCreateIndexSql);
+}
+
+int DABatchRequest::Add(DAAddColumnRequest& request)
+{
+    return AddStatement(request, &DASqlGenerator::GetAddColumnSql);
+}
+
+int DABatchRequest::Add(DAInsertRequest& request)
+{
+    return AddStatement(request, &DASqlGenerator::GetInsertSql);
 }

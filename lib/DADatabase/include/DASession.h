@@ -1,0 +1,162 @@
+#ifndef DASESSION_H
+#define DASESSION_H
+
+#include <cstdint>
+#include <memory>
+
+#include "DAAddColumnRequest.h"
+#include "DABasePath.h"
+#include "DABatchRequest.h"
+#include "DACreateIndexRequest.h"
+#include "DACreateRequest.h"
+#include "DACursor.h"
+#include "DADeleteRequest.h"
+#include "DADropRequest.h"
+#include "DAInsertRequest.h"
+#include "DAJoinRequest.h"
+#include "DAQueryRequest.h"
+#include "DASelectRequest.h"
+#include "DAUpdateRequest.h"
+#include "DAUpsertRequest.h"
+
+struct DASessionState;
+
+/// One database file held open from Open to Close (or destruction), running
+/// the requests DADatabase runs: the same statements, results, codes and log
+/// lines, the lines under "DASession.cpp" and the operation's name (e.g.
+/// "DASession.cpp: Upsert(NN) > Upsert SUCCESS[0]"). The file is opened and
+/// its schema read once, not per call.
+///
+/// Location: a request with no location runs at the session's file; a
+/// request naming the session's file runs there; anything else is refused
+/// with 21 (SQLITE_MISUSE) and the line "<operation> FAILED[21]: request
+/// location <path> is not the session's <path>" (the rule of
+/// DABatchRequest::Add). Every operation on a closed session returns 21 with
+/// the error line "SESSION NOT OPEN" (Select and Query add "OpenDB Error:
+/// 21", as for a failed open).
+///
+/// Threads: any number of threads may call one session at once. Writes
+/// (every operation but the reads below) are serialised on the one writer
+/// connection, a whole batch or migration step at a time. With the
+/// write-ahead log (the default) reads (Select, JoinSelect, Query,
+/// CheckExistTable, GetVersion, GetSpace) run side by side with each other
+/// and with the write in progress, each on a reader connection of a small
+/// pool opened on demand (up to 4 kept idle): a read never waits for a
+/// write and sees the last commit before it began. Without the log every
+/// operation runs on the writer connection, one at a time. Open, Close and
+/// the setters wait for the operations in progress and hold off new ones.
+///
+/// Between a session and other connections (per-call visits of DADatabase,
+/// other sessions, other processes) the busy-retry rule of DADatabase holds
+/// unchanged; no busy handler is set. Its own readers never make a read
+/// wait; rarely, a reader that meets the log's index being rewritten holds
+/// the write lock for an instant, and a write starting then pauses once
+/// under that rule. Readers follow the session's own schema changes at
+/// once; after a schema change made by another connection, the first read
+/// on each reader that meets it fails at its step (the parser's line; the
+/// reader is then replaced). Per-call visits of a file a session holds with
+/// the log see every committed row. Close checkpoints the log into the file
+/// and removes it when no other connection has the file open (else the last
+/// one to close does); the file stays in WAL mode, which any SQLite program
+/// reads.
+///
+/// Not copyable. No exceptions of its own; Open throws std::logic_error for
+/// an incomplete location, std::bad_alloc passes through.
+class DASession {
+public:
+    DASession();
+    /// Closes the session.
+    virtual ~DASession();
+
+    DASession(const DASession&) = delete;
+    DASession& operator=(const DASession&) = delete;
+
+    ///@{
+    /// Options, taking effect at the next Open.
+    ///
+    /// SetWal (default true): the write-ahead log, so that reads and one
+    /// write run side by side. False puts the file in the rollback journal
+    /// (DELETE) mode.
+    ///
+    /// SetSyncOnCommit (default true): every commit is synced
+    /// (synchronous=FULL): nothing acknowledged is lost on power loss.
+    /// False is synchronous=NORMAL: the file stays whole, the last commits
+    /// may be lost on power loss (what survives is a prefix of what was
+    /// acknowledged).
+    ///
+    /// SetSizeLimit (default 0: none): the file refuses to grow past bytes
+    /// (rounded down to whole pages; never below its size at Open): a write
+    /// that needs more returns 13 "database or disk is full" while the disk
+    /// still has room, so a Delete can still free space. The log counts
+    /// too: once it holds an eighth of the budget (at least 16, at most 1000
+    /// pages) it is checkpointed, cut back to that size when it restarts,
+    /// and truncated when it has grown past twice that. File and log
+    /// together thus stay within the budget plus a margin of a quarter of
+    /// it, plus the pages of the one transaction being committed (a large
+    /// batch holds all of its pages in the log until its commit).
+    void SetWal(bool wal);
+    void SetSyncOnCommit(bool sync);
+    void SetSizeLimit(std::int64_t bytes);
+    ///@}
+
+    /// Opens location's file (creating a missing file) under busy-retry, with
+    /// the options set. An open session is closed first. Returns 0, or the
+    /// code of the step that failed with the error line "DB open failed.
+    /// Error no(rc): text": 14 when the directory does not exist (nothing is
+    /// created), 26 when the file is not a database. A failed Open leaves the
+    /// session closed. Throws std::logic_error when location is incomplete.
+    int Open(DABasePath& location);
+
+    /// Waits for the operations in progress, then closes every connection.
+    /// Nothing happens on a closed session.
+    void Close();
+
+    /// True between a successful Open and Close.
+    bool IsOpen() const;
+
+    ///@{
+    /// DADatabase's operations of the same names, run at the session's file
+    /// (see above): statements, codes, cursor handling and lines as stated in
+    /// DADatabase.h.
+    int DropTable(DADropRequest& request);
+    int Update(DAUpdateRequest& request);
+    int Delete(DADeleteRequest& request);
+    int Upsert(DAUpsertRequest& request);
+    int CreateTable(DACreateRequest& request);
+    int ExecuteBatch(DABatchRequest& batch);
+    int Select(DASelectRequest& request, DACursor& cursor);
+    int JoinSelect(DAJoinRequest& request, DACursor& cursor);
+    int Query(DAQueryRequest& request, DACursor& cursor);
+    ///@}
+
+    /// exists: whether a table named exactly tableName exists in the
+    /// session's file. A null tableName throws std::logic_error.
+    int CheckExistTable(char const* tableName, bool& exists);
+
+    ///@{
+    /// DADatabase's schema operations of the same names, at the session's
+    /// file: codes and lines as stated in DADatabase.h. GetVersion, GetSpace
+    /// and Compact take no location (the session's file); Migrate's step
+    /// follows the location rule above.
+    int CreateIndex(DACreateIndexRequest& request);
+    int AddColumn(DAAddColumnRequest& request);
+    int GetVersion(int& version);
+    int Migrate(DABatchRequest& step, int version);
+    int GetSpace(std::int64_t& fileBytes, std::int64_t& freeBytes);
+    int Compact();
+    ///@}
+
+    ///@{
+    /// DADatabase's writes that report what they did, at the session's file:
+    /// Insert gives the new row's id, Update and Delete the rows changed;
+    /// codes, lines and when the outputs are set as stated in DADatabase.h.
+    int Insert(DAInsertRequest& request, std::int64_t& rowId);
+    int Update(DAUpdateRequest& request, int& changes);
+    int Delete(DADeleteRequest& request, int& changes);
+    ///@}
+
+private:
+    std::unique_ptr<DASessionState> m_state;
+};
+
+#endif  // DASESSION_H

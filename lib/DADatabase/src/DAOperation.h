@@ -1,0 +1,99 @@
+#ifndef DAOPERATION_H
+#define DAOPERATION_H
+
+// The operations, written once for per-call visits (DADatabase) and held
+// sessions (DASession): generate the statement, run it under busy-retry,
+// log, parse. Only where the connection comes from differs, and that is a
+// DAConnectionSource.
+
+#include <cstdint>
+#include <memory>
+#include <string>
+
+#include <sqlite3.h>
+
+#include "DAAddColumnRequest.h"
+#include "DABasePath.h"
+#include "DABatchRequest.h"
+#include "DACreateIndexRequest.h"
+#include "DACreateRequest.h"
+#include "DACursor.h"
+#include "DADeleteRequest.h"
+#include "DADropRequest.h"
+#include "DAInsertRequest.h"
+#include "DAJoinRequest.h"
+#include "DAQueryRequest.h"
+#include "DASelectRequest.h"
+#include "DAUpdateRequest.h"
+#include "DAUpsertRequest.h"
+
+class DAConnectionSource;
+
+// Ends a lease: a per-call visit closes the connection, a session takes it
+// back (and lets the next writer in).
+struct DALeaseEnd {
+    DAConnectionSource* source = nullptr;
+    void operator()(sqlite3* db) const noexcept;
+};
+using DALease = std::unique_ptr<sqlite3, DALeaseEnd>;
+
+// What an operation will do with its connection: a session serialises
+// writers and lets readers run beside them.
+enum class DAAccess { Read, Write };
+
+// Where the operations' connections come from, and the file name their
+// lines carry.
+class DAConnectionSource {
+public:
+    explicit DAConnectionSource(const char* file) : m_file(file) {}
+    virtual ~DAConnectionSource() = default;
+
+    DAConnectionSource(const DAConnectionSource&) = delete;
+    DAConnectionSource& operator=(const DAConnectionSource&) = delete;
+
+    // The source file name written in the lines of this source's operations.
+    const char* File() const { return m_file; }
+
+    // Lends a connection to location's file for one operation of func:
+    // returns 0 with lease set, or the failure's code with lease empty and
+    // the failure's lines written. May throw what GetPath throws.
+    virtual int Acquire(DABasePath& location, DAAccess access, const char* func, DALease& lease) = 0;
+
+    // Takes back a connection Acquire lent.
+    virtual void Release(sqlite3* db) noexcept = 0;
+
+    // The busy-retry step, logged under this source's file.
+    virtual bool IsRetryLimit(int& count) = 0;
+
+private:
+    const char* m_file;
+};
+
+// Every operation, written once over any connection source: DADatabase
+// and DASession forward to these, each with its own source. Contracts,
+// codes and lines are those stated in DADatabase.h; the lines carry the
+// source's file name and the operation's name.
+struct DAOperations {
+    static int DropTable(DAConnectionSource& source, DADropRequest& request);
+    static int Update(DAConnectionSource& source, DAUpdateRequest& request);
+    static int Delete(DAConnectionSource& source, DADeleteRequest& request);
+    static int Upsert(DAConnectionSource& source, DAUpsertRequest& request);
+    static int CreateTable(DAConnectionSource& source, DACreateRequest& request);
+    static int ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch);
+    static int Select(DAConnectionSource& source, DASelectRequest& request, DACursor& cursor);
+    static int JoinSelect(DAConnectionSource& source, DAJoinRequest& request, DACursor& cursor);
+    static int Query(DAConnectionSource& source, DAQueryRequest& request, DACursor& cursor);
+    static int CheckExistTable(DAConnectionSource& source, DABasePath& location, char const* tableName, bool& exists);
+    static int CreateIndex(DAConnectionSource& source, DACreateIndexRequest& request);
+    static int AddColumn(DAConnectionSource& source, DAAddColumnRequest& request);
+    static int GetVersion(DAConnectionSource& source, DABasePath& location, int& version);
+    static int Migrate(DAConnectionSource& source, DABatchRequest& step, int version);
+    static int GetSpace(DAConnectionSource& source, DABasePath& location, std::int64_t& fileBytes,
+                        std::int64_t& freeBytes);
+    static int Compact(DAConnectionSource& source, DABasePath& location);
+    static int Insert(DAConnectionSource& source, DAInsertRequest& request, std::int64_t& rowId);
+    static int Update(DAConnectionSource& source, DAUpdateRequest& request, int& changes);
+    static int Delete(DAConnectionSource& source, DADeleteRequest& request, int& changes);
+};
+
+#endif  // DAOPERATION_H

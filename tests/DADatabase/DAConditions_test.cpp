@@ -1,0 +1,216 @@
+// Listed conditions, select lists, inserts and change counts on real files.
+
+#include <atomic>
+#include <chrono>
+#include <cstdint>
+#include <thread>
+
+#include "DADatabase.h"
+#include "DASqlGenerator.h"
+#include "DatabaseTestUtil.h"
+#include "TempDirTest.h"
+
+namespace {
+
+class DAConditions : public TempDirTest {
+protected:
+    // The ids request's query gives, sorted by id, and its statement.
+    std::string Ids(DAQueryRequest& request, int expectedRc = 0)
+    {
+        At(request, Dir(), "m").SetOrderBy("id");
+        DACursor cursor;
+        EXPECT_EQ(expectedRc, DADatabase().Query(request, cursor));
+        std::string ids;
+        for (const std::string& id : ColumnValues(cursor, "id")) {
+            ids += id;
+        }
+        return ids;
+    }
+};
+
+// A condition, its text after "WHERE ", and the ids of the rows it selects.
+struct OperatorCase {
+    void (*set)(DABaseSet&);
+    const char* text;
+    const char* ids;
+};
+
+// Numbers in an INTEGER, a REAL, a TEXT and an untyped column: unquoted
+// numbers compare as numbers wherever the column's affinity lets them (a
+// TEXT column turns them into text, as SQLite's rules say), quoted ones as
+// text.
+const OperatorCase kOperators[] = {
+    {[](DABaseSet& r) { r.SetWhere("i", DACompare::Less, 10); }, "i<10", "1"},
+    {[](DABaseSet& r) { r.SetWhere("i", DACompare::LessEqual, 10L); }, "i<=10", "12"},
+    {[](DABaseSet& r) { r.SetWhere("i", DACompare::Greater, short{9}); }, "i>9", "23"},
+    {[](DABaseSet& r) { r.SetWhere("i", DACompare::GreaterEqual, std::uint64_t{100}); }, "i>=100", "3"},
+    {[](DABaseSet& r) { r.SetWhere("i", DACompare::Equal, 10U); }, "i=10", "2"},
+    {[](DABaseSet& r) { r.SetWhere("i", DACompare::NotEqual, "10"); }, "i<>'10'", "13"},
+    {[](DABaseSet& r) { r.SetWhere("i", DACompare::Less, UINT64_MAX); }, "i<18446744073709551615", "123"},
+    {[](DABaseSet& r) { r.SetWhere("r", DACompare::GreaterEqual, 2.5); }, "r>=2.5", "12"},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Greater, 10); }, "t>10", "13"},
+    {[](DABaseSet& r) { r.SetWhere("u", DACompare::Less, 10); }, "u<10", "1"},
+    {[](DABaseSet& r) { r.SetWhere("u", DACompare::Less, "10"); }, "u<'10'", "12"},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Like, "A%"); }, "t LIKE 'A%'", "3"},
+    {[](DABaseSet& r) {
+         r.SetWhereIn("t", {"9", "abc", "x'y"});
+     },
+     "t IN ('9', 'abc', 'x''y')", "13"},
+    {[](DABaseSet& r) { r.SetWhereIn("i", {}); }, "i IN ()", ""},
+    {[](DABaseSet& r) { r.SetWhereNull("u"); }, "u IS NULL", "4"},
+    {[](DABaseSet& r) { r.SetWhereNull("m.u", false); }, "m.u IS NOT NULL", "123"},
+};
+
+TEST_F(DAConditions, EachOperatorSelectsItsRows)
+{
+    RawDb(PathOf("t.db"))
+        .Run("CREATE TABLE m(id INTEGER PRIMARY KEY, i INTEGER, r REAL, t TEXT, u);"
+             "INSERT INTO m VALUES (1, 9, 2.5, '9', 9), (2, 10, 10.0, '10', 10), (3, 100, -1.5, 'abc', 'x'),"
+             "(4, NULL, NULL, NULL, NULL)");
+    for (const OperatorCase& c : kOperators) {
+        DAQueryRequest request;
+        c.set(request);
+        std::string sql;
+        DASqlGenerator().GetSelectSql(At(request, Dir(), "m"), sql);
+        EXPECT_EQ(std::string("SELECT * FROM m WHERE ") + c.text, sql);
+        EXPECT_EQ(c.ids, Ids(request)) << c.text;
+    }
+}
+
+// A range in Update and Delete, with the rows each changed; a failure
+// leaves the count alone; the lines are the one-argument operations'.
+TEST_F(DAConditions, RangesInUpdateAndDeleteCountTheirChanges)
+{
+    RawDb(PathOf("t.db"))
+        .Run("CREATE TABLE e(ts INTEGER, v TEXT); WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL "
+             "SELECT i + 1 FROM n WHERE i < 10) INSERT INTO e SELECT i, 'a' FROM n");
+    DADatabase db;
+    LogCapture log;
+    DAUpdateRequest update;
+    At(update, Dir(), "e").SetData("v", "b");
+    update.SetWhere("ts", DACompare::GreaterEqual, 3);
+    update.SetWhere("ts", DACompare::LessEqual, 5);
+    int changes = -1;
+    EXPECT_EQ(0, db.Update(update, changes));
+    EXPECT_EQ(3, changes);
+    DADeleteRequest remove;
+    At(remove, Dir(), "e").SetWhere("ts", DACompare::Less, std::int64_t{5});
+    EXPECT_EQ(0, db.Delete(remove, changes));
+    EXPECT_EQ(4, changes);
+    EXPECT_EQ("5|b;6|a;7|a;8|a;9|a;10|a", RawDb(PathOf("t.db")).Query("SELECT * FROM e"));
+    changes = 42;
+    EXPECT_EQ(1, db.Update(At(update, Dir(), "missing"), changes));
+    EXPECT_EQ(1, db.Delete(At(remove, Dir(), "missing"), changes));
+    EXPECT_EQ(42, changes);
+    EXPECT_EQ((Strings{"4 DADatabase.cpp:Update > update SUCCESS[0]", "4 DADatabase.cpp:Delete > delete SUCCESS[0]",
+                       "6 DADatabase.cpp:Update > update FAILED[1]: no such table: missing",
+                       "6 DADatabase.cpp:Delete > delete FAILED[1]: no such table: missing"}),
+              Described(log));
+}
+
+// Pages of 50 below the last time stamp seen, newest first, while another
+// thread keeps adding newer events (at a pace: a writer that never
+// pauses starves readers under the busy rule): every event up to the first page's
+// newest comes exactly once, in order.
+TEST_F(DAConditions, KeysetPagesMissNothingWhileAnotherThreadInserts)
+{
+    RawDb(PathOf("t.db"))
+        .Run("CREATE TABLE e(id INTEGER PRIMARY KEY, ts INTEGER); CREATE INDEX e_ts ON e(ts);"
+             "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 420) "
+             "INSERT INTO e(ts) SELECT 1700000000000 + i FROM n");
+    std::atomic<bool> done{false};
+    std::atomic<int> written{0};
+    std::thread writer([&] {
+        DADatabase db;
+        for (std::int64_t ts = 1700000000421; !done.load(); ++ts, ++written) {
+            DAInsertRequest insert;
+            At(insert, Dir(), "e").SetData("ts", ts);
+            std::int64_t id = 0;
+            EXPECT_EQ(0, db.Insert(insert, id));
+            std::this_thread::sleep_for(std::chrono::milliseconds(5));  // events come at a pace
+        }
+    });
+    while (written.load() == 0) {
+        std::this_thread::yield();
+    }
+    std::vector<std::int64_t> seen;
+    for (std::int64_t last = INT64_MAX;;) {
+        DAQueryRequest page;
+        At(page, Dir(), "e").SetWhere("ts", DACompare::Less, last);
+        page.SetOrderBy("ts", true);
+        page.SetLimit(50);
+        DACursor cursor;
+        const int rc = DADatabase().Query(page, cursor);
+        EXPECT_EQ(0, rc);
+        while (cursor.MoveToNext() == 0) {
+            EXPECT_EQ(0, cursor.GetInt64("ts", last));
+            seen.push_back(last);
+        }
+        if (rc != 0 || cursor.GetCount() < 50) {
+            break;
+        }
+    }
+    done.store(true);
+    writer.join();
+    EXPECT_GT(seen.front(), 1700000000420) << "the writer's first event is on the first page";
+    ASSERT_GE(seen.size(), 420U);
+    for (std::size_t i = 0; i < seen.size(); ++i) {
+        ASSERT_EQ(seen.front() - static_cast<std::int64_t>(i), seen[i]) << i;
+    }
+    EXPECT_EQ(1700000000001, seen.back());
+}
+
+// COUNT and MAX per type, the largest group first.
+TEST_F(DAConditions, CountsPerType)
+{
+    RawDb(PathOf("t.db"))
+        .Run("CREATE TABLE e(ts INTEGER, type TEXT); INSERT INTO e VALUES (1, 'alarm'), "
+             "(2, 'door'), (3, 'alarm'), (4, 'info'), (5, 'alarm'), (6, 'door')");
+    DAQueryRequest counts;
+    At(counts, Dir(), "e").AddColumn("type");
+    counts.AddAggregate(DAAggregate::Count, nullptr, "n");
+    counts.AddAggregate(DAAggregate::Max, "ts", "newest");
+    counts.AddGroupBy("type");
+    counts.SetWhere("ts", DACompare::Greater, 1);
+    counts.SetOrderBy("n", true);
+    counts.SetOrderBy("type");
+    DACursor cursor;
+    ASSERT_EQ(0, DADatabase().Query(counts, cursor));
+    EXPECT_EQ((Strings{"alarm", "door", "info"}), ColumnValues(cursor, "type"));
+    EXPECT_EQ((Strings{"2", "2", "1"}), ColumnValues(cursor, "n"));
+    EXPECT_EQ((Strings{"5", "6", "4"}), ColumnValues(cursor, "newest"));
+}
+
+// The new row's id; a clash fails with 19 unless ignored, then -1; a
+// batch takes inserts too.
+TEST_F(DAConditions, InsertGivesTheRowIdOrFailsOnAClashUnlessIgnored)
+{
+    RawDb(PathOf("t.db")).Run("CREATE TABLE s(id INTEGER PRIMARY KEY, k TEXT UNIQUE, v TEXT)");
+    DADatabase db;
+    DAInsertRequest insert;
+    At(insert, Dir(), "s").SetData("k", "volume");
+    insert.SetData("v", "7");
+    LogCapture log;
+    std::int64_t id = 0;
+    EXPECT_EQ(0, db.Insert(insert, id));
+    EXPECT_EQ(1, id);
+    EXPECT_EQ(19, db.Insert(insert, id));
+    EXPECT_EQ(1, id);
+    insert.SetIgnoreExisting();
+    EXPECT_EQ(0, db.Insert(insert, id));
+    EXPECT_EQ(-1, id);
+    EXPECT_EQ((Strings{Logged(4, "DADatabase.cpp", "Insert", "Insert SUCCESS[0]"),
+                       Logged(6, "DADatabase.cpp", "Insert", "Insert FAILED[19]: UNIQUE constraint failed: s.k"),
+                       Logged(4, "DADatabase.cpp", "Insert", "Insert SUCCESS[0]")}),
+              Described(log));
+    DABatchRequest batch;
+    batch.SetPath(Dir().c_str(), "t.db");
+    DAInsertRequest mode;  // no location: the batch's
+    mode.SetTable("s");
+    mode.SetData("k", "mode");
+    EXPECT_EQ(0, batch.Add(mode) + batch.Add(insert) + db.ExecuteBatch(batch));
+    EXPECT_EQ(1, batch.GetChanges());
+    EXPECT_EQ("1|volume|7;2|mode|NULL", RawDb(PathOf("t.db")).Query("SELECT * FROM s"));
+}
+
+}  // namespace
