@@ -1,0 +1,211 @@
+// [ULO_BENCH_LOCATIONS="tmpfs disk"] [ULO_BENCH_SIZES="1000 10000 100000 1000000"] ulo_db_bench [flags]
+// Each location is a fresh folder, removed at the end.
+
+#include <malloc.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <iterator>
+#include <sstream>
+
+#include <SQLiteCpp/SQLiteCpp.h>
+#include <sqlite3.h>
+
+#include "DACursor.h"
+#include "bench.h"
+#include "dlog.h"
+
+namespace bench {
+
+namespace {
+std::vector<CaseFn>& Registry()
+{
+    static std::vector<CaseFn> functions;
+    return functions;
+}
+
+// Opens path, runs run on it and closes it again.
+int OnFile(const std::string& path, const std::function<int(sqlite3*)>& run)
+{
+    sqlite3* db = nullptr;
+    const int rc = sqlite3_open(path.c_str(), &db);
+    const int result = rc == SQLITE_OK ? run(db) : rc;
+    sqlite3_close(db);
+    return result;
+}
+
+bool CreateQueryDatabase(const std::string& path)
+{
+    const std::string label = "'item-' || ((i * 7919) % 1000003)";
+    std::string sql = "BEGIN;";
+    for (const int rows : SelectSizes()) {
+        sql += TableSql(SelectTable(rows), kRowColumns, rows, "i + 1, (i * 37) % 100003, i * 0.25 + 0.125, " + label);
+    }
+    sql += TableSql("jr", "gkey INTEGER PRIMARY KEY, gname TEXT", kJoinGroups, "i, 'group-' || i");
+    sql += TableSql("jl", "id INTEGER PRIMARY KEY, gid INTEGER, price REAL, label TEXT", kJoinRows,
+                    "i + 1, (i * 13) % " + std::to_string(kJoinGroups) + ", i * 0.5 + 0.25, " + label);
+    return RawExec(path, sql + "COMMIT;") == SQLITE_OK;
+}
+}  // namespace
+
+std::set<int>& SelectSizes()
+{
+    static std::set<int> sizes;
+    return sizes;
+}
+
+int Cases(CaseFn fn)
+{
+    Registry().push_back(fn);
+    return 0;
+}
+
+benchmark::internal::Benchmark* Add(const std::string& name, Op op, Counters counters, Op untimed)
+{
+    auto body = [=](benchmark::State& state) {
+        for (auto _ : state) {
+            if (untimed) {
+                state.PauseTiming();
+                untimed();
+                state.ResumeTiming();
+            }
+            if (const int rc = op()) {
+                state.SkipWithError((name + " failed: " + std::to_string(rc)).c_str());
+                break;
+            }
+        }
+        state.counters.insert(counters.begin(), counters.end());
+    };
+    return benchmark::RegisterBenchmark(name.c_str(), body)->UseRealTime()->Unit(benchmark::kMicrosecond);
+}
+
+int RawExec(const std::string& path, const std::string& sql)
+{
+    return OnFile(path, [&](sqlite3* db) { return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr); });
+}
+
+int RawSelectOn(sqlite3* db, const std::string& sql, Columns& columns)
+{
+    sqlite3_stmt* stmt = nullptr;
+    const int rc = sqlite3_prepare_v2(db, sql.c_str(), -1, &stmt, nullptr);
+    const int count = sqlite3_column_count(stmt);
+    columns.assign(static_cast<std::size_t>(count), {});
+    while (rc == SQLITE_OK && sqlite3_step(stmt) == SQLITE_ROW) {
+        for (int i = 0; i < count; ++i) {
+            const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(stmt, i));
+            columns[static_cast<std::size_t>(i)].emplace_back(text != nullptr ? text : "");
+        }
+    }
+    sqlite3_finalize(stmt);
+    return rc;
+}
+
+int RawSelect(const std::string& path, const std::string& sql, Columns& columns)
+{
+    return OnFile(path, [&](sqlite3* db) { return RawSelectOn(db, sql, columns); });
+}
+
+Op Rows(std::function<int(DACursor&)> select, int rows)
+{
+    return [=] {
+        DACursor cursor;
+        const int rc = select(cursor);
+        return rc != SQLITE_OK ? rc : cursor.GetCount() == rows ? 0 : -1;
+    };
+}
+
+Op RawRows(const std::string& path, const std::string& sql, int rows)
+{
+    return [=] {
+        Columns columns;
+        const int rc = RawSelect(path, sql, columns);
+        return rc != SQLITE_OK ? rc : !columns.empty() && columns[0].size() == static_cast<std::size_t>(rows) ? 0 : -1;
+    };
+}
+
+int SqliteCppSelect(const std::string& path, const std::string& sql, Columns& columns)
+{
+    try {
+        SQLite::Database db(path, SQLite::OPEN_READWRITE);
+        SQLite::Statement query(db, sql);
+        columns.assign(static_cast<std::size_t>(query.getColumnCount()), {});
+        while (query.executeStep()) {
+            for (std::size_t i = 0; i < columns.size(); ++i) {
+                columns[i].emplace_back(query.getColumn(static_cast<int>(i)).getText());
+            }
+        }
+    } catch (const std::exception& error) {
+        std::fprintf(stderr, "SQLiteCpp: %s\n", error.what());
+        return 1;
+    }
+    return 0;
+}
+
+double HeapInUse()
+{
+    const struct mallinfo2 info = mallinfo2();
+    return static_cast<double>(info.uordblks + info.hblkhd);
+}
+
+std::string TableSql(const std::string& table, const std::string& columns, int rows, const std::string& values)
+{
+    return "CREATE TABLE " + table + " (" + columns + "); INSERT INTO " + table + " SELECT " + values +
+        " FROM (WITH RECURSIVE c(i) AS (SELECT 0 UNION ALL SELECT i + 1 FROM c WHERE i < " + std::to_string(rows - 1) +
+        ") SELECT i FROM c);";
+}
+
+std::string FreshTable(const std::string& table, int rows)
+{
+    return "DROP TABLE IF EXISTS " + table + ";" +
+        TableSql(table, kRowColumns, rows, "i + 1, (i + 1) * 3, (i + 1) * 0.5, 'row-' || (i + 1)");
+}
+
+}  // namespace bench
+
+int main(int argc, char** argv)
+{
+    benchmark::Initialize(&argc, argv);
+    dlog_set_sink(dlog_discard_sink, nullptr);
+    // glibc raises its mmap threshold at the first free of a large mapped block: one now puts every case in
+    // the regime of a long-running process, whichever runs first.
+    void* block = std::malloc(16U << 20U);
+    benchmark::DoNotOptimize(block);
+    std::free(block);
+    const auto list = [](const char* variable, const char* fallback) {
+        std::istringstream words(std::getenv(variable) != nullptr ? std::getenv(variable) : fallback);
+        return std::vector<std::string>(std::istream_iterator<std::string>(words), {});
+    };
+    bench::SelectSizes().insert(100000);  // the page and walk cases read it
+    for (const std::string& size : list("ULO_BENCH_SIZES", "1000 10000 100000 1000000")) {
+        bench::SelectSizes().insert(std::stoi(size));
+    }
+    const std::vector<std::string> names = list("ULO_BENCH_LOCATIONS", "tmpfs disk");
+    std::vector<bench::Location> locations;
+    for (const std::string& name : names) {
+        std::string dir = (name == "tmpfs" ? "/dev/shm" : list("TMPDIR", "/tmp").at(0)) + "/ulo_db_bench.XXXXXX";
+        if (mkdtemp(dir.data()) == nullptr || !bench::CreateQueryDatabase(dir + "/" + bench::kQueryFile)) {
+            std::perror(dir.c_str());
+            break;
+        }
+        locations.push_back({name, dir});
+    }
+    const bool ready = locations.size() == names.size();
+    if (ready) {
+        benchmark::AddCustomContext("sqlite_version", sqlite3_libversion());
+        benchmark::AddCustomContext("compiler", __VERSION__);
+        for (const bench::CaseFn fn : bench::Registry()) {
+            for (const bench::Location& location : locations) {
+                fn(location);
+            }
+            fn({"memory", ""});
+        }
+        benchmark::RunSpecifiedBenchmarks();
+    }
+    benchmark::Shutdown();
+    for (const bench::Location& location : locations) {
+        std::error_code ignored;
+        std::filesystem::remove_all(location.dir, ignored);
+    }
+    return ready ? 0 : 1;
+}
