@@ -393,7 +393,10 @@ TEST_P(PowerCut, LeavesAWholeFileWithAPrefixOfTheRows)
             // checkpoints, here every 64 pages, so that some rows survive.
             session.SetSizeLimit(2 << 20);
             DABasePath location;
-            for (int k = next, opened = session.Open(At(location, Dir())); opened == 0; ++k) {
+            if (session.Open(At(location, Dir())) != 0) {
+                _exit(2);
+            }
+            for (int k = next;; ++k) {  // until killed
                 DAUpsertRequest request;
                 At(request, Dir(), "t").SetData("k", k);
                 request.SetData("v", std::string(k % 30, 'v').c_str());
@@ -401,7 +404,6 @@ TEST_P(PowerCut, LeavesAWholeFileWithAPrefixOfTheRows)
                     _exit(1);
                 }
             }
-            _exit(2);
         }
         ASSERT_GT(pid, 0);
         close(fds[1]);

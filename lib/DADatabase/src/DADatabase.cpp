@@ -12,7 +12,7 @@ namespace {
 // when done.
 class DAVisit : public DAConnectionSource {
 public:
-    explicit DAVisit(DADatabase& database) : DAConnectionSource(DA_FILE_NAME), m_database(database) {}
+    DAVisit(DADatabase& database, int line) : DAConnectionSource(DA_FILE_NAME, line), m_database(database) {}
 
     int Acquire(DABasePath& location, DAAccess /*access*/, const char* /*func*/, DALease& lease) override
     {
@@ -64,114 +64,114 @@ bool DADatabase::IsRetryLimit(int& count)
 
 int DADatabase::DropTable(DADropRequest& request)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::DropTable(visit, request);
 }
 
 int DADatabase::Update(DAUpdateRequest& request)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Update(visit, request);
 }
 
 int DADatabase::Delete(DADeleteRequest& request)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Delete(visit, request);
 }
 
 int DADatabase::Upsert(DAUpsertRequest& request)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Upsert(visit, request);
 }
 
 int DADatabase::CreateTable(DACreateRequest& request)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::CreateTable(visit, request);
 }
 
 int DADatabase::ExecuteBatch(DABatchRequest& batch)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::ExecuteBatch(visit, batch);
 }
 
 int DADatabase::Select(DASelectRequest& request, DACursor& cursor)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Select(visit, request, cursor);
 }
 
 int DADatabase::JoinSelect(DAJoinRequest& request, DACursor& cursor)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::JoinSelect(visit, request, cursor);
 }
 
 int DADatabase::Query(DAQueryRequest& request, DACursor& cursor)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Query(visit, request, cursor);
 }
 
 int DADatabase::CheckExistTable(DABasePath& location, char const* tableName, bool& exists)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::CheckExistTable(visit, location, tableName, exists);
 }
 
 int DADatabase::CreateIndex(DACreateIndexRequest& request)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::CreateIndex(visit, request);
 }
 
 int DADatabase::AddColumn(DAAddColumnRequest& request)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::AddColumn(visit, request);
 }
 
 int DADatabase::GetVersion(DABasePath& location, int& version)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::GetVersion(visit, location, version);
 }
 
 int DADatabase::Migrate(DABatchRequest& step, int version)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Migrate(visit, step, version);
 }
 
 int DADatabase::GetSpace(DABasePath& location, std::int64_t& fileBytes, std::int64_t& freeBytes)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::GetSpace(visit, location, fileBytes, freeBytes);
 }
 
 int DADatabase::Compact(DABasePath& location)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Compact(visit, location);
 }
 
 int DADatabase::Insert(DAInsertRequest& request, std::int64_t& rowId)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Insert(visit, request, rowId);
 }
 
 int DADatabase::Update(DAUpdateRequest& request, int& changes)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Update(visit, request, changes);
 }
 
 int DADatabase::Delete(DADeleteRequest& request, int& changes)
 {
-    DAVisit visit(*this);
+    DAVisit visit(*this, __LINE__);
     return DAOperations::Delete(visit, request, changes);
 }

@@ -23,8 +23,8 @@ std::string JoinedPath(DABasePath& location)
 
 }  // namespace
 
-int DACheckLocation(DABasePath& owner, DABasePath& request, const char* file, const char* func, const char* ownerName,
-                    std::string (&scratch)[4])
+int DACheckLocation(DABasePath& owner, DABasePath& request, const char* file, const char* func, int line,
+                    const char* ownerName, std::string (&scratch)[4])
 {
     if (request.IsPathEmpty()) {
         return SQLITE_OK;
@@ -43,7 +43,7 @@ int DACheckLocation(DABasePath& owner, DABasePath& request, const char* file, co
     if (request.IsPathSet() && owner.IsPathSet() && requested == own) {
         return SQLITE_OK;
     }
-    DA_LOG_WHERE(DLOG_ERROR, file, func, __LINE__, "%s FAILED[%d]: request location %s is not the %s's %s", func,
+    DA_LOG_WHERE(DLOG_ERROR, file, func, line, "%s FAILED[%d]: request location %s is not the %s's %s", func,
                  SQLITE_MISUSE, requested.c_str(), ownerName, own.c_str());
     return SQLITE_MISUSE;
 }

@@ -14,10 +14,11 @@
 //
 // Returns 0 when request may run at owner's file; otherwise logs "<func>
 // FAILED[21]: request location <path> is not the <ownerName>'s <path>" (an
-// incomplete location reads "(incomplete)") under file and func and returns
-// SQLITE_MISUSE (21). scratch: four strings the check may overwrite, kept by
-// a caller that checks often so that their capacity is reused.
-int DACheckLocation(DABasePath& owner, DABasePath& request, const char* file, const char* func, const char* ownerName,
-                    std::string (&scratch)[4]);
+// incomplete location reads "(incomplete)") with the fields file, func and
+// line, and returns SQLITE_MISUSE (21). scratch: four strings the check may
+// overwrite, kept by a caller that checks often so that their capacity is
+// reused.
+int DACheckLocation(DABasePath& owner, DABasePath& request, const char* file, const char* func, int line,
+                    const char* ownerName, std::string (&scratch)[4]);
 
 #endif  // DALOCATIONRULE_H

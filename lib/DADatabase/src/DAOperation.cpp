@@ -65,9 +65,10 @@ int RunWrite(DAConnectionSource& source, Request& request, void (DASqlGenerator:
     rc = ExecWhileBusy(source, db.get(), sql.c_str(), error);
     if (rc == SQLITE_OK) {
         done(db.get());
-        DA_LOG_WHERE(DLOG_INFO, source.File(), func, __LINE__, "%s SUCCESS[%d]", word, rc);
+        DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "%s SUCCESS[%d]", word, rc);
     } else {
-        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__, "%s FAILED[%d]: %s", word, rc, FailureText(error, rc));
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
+                     FailureText(error, rc));
     }
     return rc;
 }
@@ -85,7 +86,7 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
     const int openRc = source.Acquire(location, DAAccess::Read, func, db);
     if (openRc != SQLITE_OK) {
         if (logOpenFailure) {
-            DA_LOG_WHERE(DLOG_INFO, source.File(), func, __LINE__, "OpenDB Error: %d", openRc);
+            DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "OpenDB Error: %d", openRc);
         }
         return openRc;
     }
@@ -100,7 +101,7 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
         return result;
     });
     if (rc != SQLITE_OK) {
-        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__, "%s FAILED[%d]: %s", word, rc,
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
                      sqlite3_errmsg(db.get()));
         return rc;
     }
@@ -128,7 +129,8 @@ int RunCursorQuery(DAConnectionSource& source, Request& request,
             if (rc == SQLITE_DONE) {
                 return SQLITE_OK;
             }
-            DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__, "%s FAILED[%d]: %s", word, rc, failure.c_str());
+            DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
+                         failure.c_str());
             return rc;
         },
         func, word, logOpenFailure);
@@ -211,7 +213,8 @@ int RunRead(DAConnectionSource& source, DABasePath& location, const char* sql, s
     DAErrorText error;
     rc = ReadIntegers(source, db.get(), sql, values, error);
     if (rc != SQLITE_OK) {
-        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__, "%s FAILED[%d]: %s", func, rc, FailureText(error, rc));
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", func, rc,
+                     FailureText(error, rc));
     }
     return rc;
 }
@@ -273,11 +276,12 @@ int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch
         });
     if (rc == SQLITE_OK) {
         batch.m_changes = changes;
-        DA_LOG_WHERE(DLOG_INFO, source.File(), func, __LINE__, "ExecuteBatch SUCCESS[%d]: %d statements", rc, count);
+        DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "ExecuteBatch SUCCESS[%d]: %d statements", rc,
+                     count);
         return rc;
     }
-    DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__, "ExecuteBatch FAILED[%d] at %d/%d: %s", rc, step, count,
-                 FailureText(error, rc));
+    DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "ExecuteBatch FAILED[%d] at %d/%d: %s", rc, step,
+                 count, FailureText(error, rc));
     return rc;
 }
 
@@ -339,7 +343,7 @@ int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int 
 {
     const char* const func = "Migrate";
     if (version <= 0) {
-        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__,
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(),
                      "Migrate FAILED[%d]: step for version %d, versions start at 1", SQLITE_MISUSE, version);
         return SQLITE_MISUSE;
     }
@@ -354,7 +358,8 @@ int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int 
     std::array<std::int64_t, 1> current{};
     rc = ReadIntegers(source, db.get(), kReadVersion, current, error);
     if (rc != SQLITE_OK) {
-        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__, "Migrate FAILED[%d]: %s", rc, FailureText(error, rc));
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "Migrate FAILED[%d]: %s", rc,
+                     FailureText(error, rc));
         return rc;
     }
     const int count = step.m_count;
@@ -372,21 +377,21 @@ int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int 
             },
             [&] { return ExecWhileBusy(source, db.get(), setVersion.c_str(), error); });
         if (rc == SQLITE_OK) {
-            DA_LOG_WHERE(DLOG_INFO, source.File(), func, __LINE__, "Migrate SUCCESS[%d]: version %d", rc, version);
+            DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "Migrate SUCCESS[%d]: version %d", rc, version);
             return rc;
         }
         if (rc != kNotDue) {
-            DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__, "Migrate FAILED[%d] at %d/%d: %s", rc, at, count,
-                         FailureText(error, rc));
+            DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "Migrate FAILED[%d] at %d/%d: %s", rc, at,
+                         count, FailureText(error, rc));
             return rc;
         }
     }
     const auto file = static_cast<long long>(current[0]);
     if (current[0] >= version) {
-        DA_LOG_WHERE(DLOG_INFO, source.File(), func, __LINE__, "Migrate SKIPPED: file at version %lld", file);
+        DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "Migrate SKIPPED: file at version %lld", file);
         return SQLITE_OK;
     }
-    DA_LOG_WHERE(DLOG_ERROR, source.File(), func, __LINE__,
+    DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(),
                  "Migrate FAILED[%d]: file at version %lld, step for version %d", SQLITE_MISUSE, file, version);
     return SQLITE_MISUSE;
 }

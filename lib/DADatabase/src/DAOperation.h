@@ -41,18 +41,21 @@ using DALease = std::unique_ptr<sqlite3, DALeaseEnd>;
 // writers and lets readers run beside them.
 enum class DAAccess { Read, Write };
 
-// Where the operations' connections come from, and the file name their
-// lines carry.
+// Where the operations' connections come from, and the file and line
+// their lines carry: those of the public operation the source serves, so
+// that a line points at the function it names.
 class DAConnectionSource {
 public:
-    explicit DAConnectionSource(const char* file) : m_file(file) {}
+    DAConnectionSource(const char* file, int line) : m_file(file), m_line(line) {}
     virtual ~DAConnectionSource() = default;
 
     DAConnectionSource(const DAConnectionSource&) = delete;
     DAConnectionSource& operator=(const DAConnectionSource&) = delete;
 
-    // The source file name written in the lines of this source's operations.
+    // The source file name and line written in the lines of this source's
+    // operation.
     const char* File() const { return m_file; }
+    int Line() const { return m_line; }
 
     // Lends a connection to location's file for one operation of func:
     // returns 0 with lease set, or the failure's code with lease empty and
@@ -67,6 +70,7 @@ public:
 
 private:
     const char* m_file;
+    int m_line;
 };
 
 // Every operation, written once over any connection source: DADatabase

@@ -66,15 +66,15 @@ namespace {
 // The session's connection source, one per operation (on its stack).
 class DASessionSource : public DAConnectionSource {
 public:
-    explicit DASessionSource(DASessionState& state) : DAConnectionSource(DA_FILE_NAME), m_state(state) {}
+    DASessionSource(DASessionState& state, int line) : DAConnectionSource(DA_FILE_NAME, line), m_state(state) {}
 
     int Acquire(DABasePath& location, DAAccess access, const char* func, DALease& lease) override
     {
         if (!m_state.writer) {
-            DA_LOG_WHERE(DLOG_ERROR, File(), func, __LINE__, "SESSION NOT OPEN");
+            DA_LOG_WHERE(DLOG_ERROR, File(), func, Line(), "SESSION NOT OPEN");
             return SQLITE_MISUSE;
         }
-        const int rc = DACheckLocation(m_state.location, location, File(), func, "session", m_scratch);
+        const int rc = DACheckLocation(m_state.location, location, File(), func, Line(), "session", m_scratch);
         if (rc != SQLITE_OK) {
             return rc;
         }
@@ -150,7 +150,7 @@ public:
     // Logs OpenDB's failure line under func, closes db, returns rc.
     int OpenFailed(int rc, DAConnection& db, const char* func)
     {
-        DA_LOG_WHERE(DLOG_ERROR, File(), func, __LINE__, "DB open failed. Error no(%d): %s", rc,
+        DA_LOG_WHERE(DLOG_ERROR, File(), func, Line(), "DB open failed. Error no(%d): %s", rc,
                      db ? sqlite3_errmsg(db.get()) : sqlite3_errstr(rc));
         db.reset();
         return rc;
@@ -187,7 +187,7 @@ private:
 // the operation's run.
 class DASessionCall : public DASessionSource {
 public:
-    explicit DASessionCall(DASessionState& state) : DASessionSource(state), m_life(state.life) {}
+    DASessionCall(DASessionState& state, int line) : DASessionSource(state, line), m_life(state.life) {}
 
 private:
     std::shared_lock<std::shared_mutex> m_life;
@@ -261,7 +261,7 @@ int DASession::Open(DABasePath& location)
     DASqlGenerator().GetDBPath(dir, file, state.path);
     state.idle.reserve(kIdleReaders);
 
-    DASessionSource source(state);
+    DASessionSource source(state, __LINE__);
     DAConnection writer;
     int rc = source.OpenConnection(state.path, kWriterFlags, func, writer);
     if (rc != SQLITE_OK) {
@@ -321,100 +321,100 @@ bool DASession::IsOpen() const
 
 int DASession::DropTable(DADropRequest& request)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::DropTable(source, request);
 }
 
 int DASession::Update(DAUpdateRequest& request)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Update(source, request);
 }
 
 int DASession::Delete(DADeleteRequest& request)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Delete(source, request);
 }
 
 int DASession::Upsert(DAUpsertRequest& request)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Upsert(source, request);
 }
 
 int DASession::CreateTable(DACreateRequest& request)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::CreateTable(source, request);
 }
 
 int DASession::ExecuteBatch(DABatchRequest& batch)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::ExecuteBatch(source, batch);
 }
 
 int DASession::Select(DASelectRequest& request, DACursor& cursor)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Select(source, request, cursor);
 }
 
 int DASession::JoinSelect(DAJoinRequest& request, DACursor& cursor)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::JoinSelect(source, request, cursor);
 }
 
 int DASession::Query(DAQueryRequest& request, DACursor& cursor)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Query(source, request, cursor);
 }
 
 int DASession::CheckExistTable(char const* tableName, bool& exists)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     DABasePath here;  // no location: the session's file
     return DAOperations::CheckExistTable(source, here, tableName, exists);
 }
 
 int DASession::CreateIndex(DACreateIndexRequest& request)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::CreateIndex(source, request);
 }
 
 int DASession::AddColumn(DAAddColumnRequest& request)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::AddColumn(source, request);
 }
 
 int DASession::GetVersion(int& version)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     DABasePath here;
     return DAOperations::GetVersion(source, here, version);
 }
 
 int DASession::Migrate(DABatchRequest& step, int version)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Migrate(source, step, version);
 }
 
 int DASession::GetSpace(std::int64_t& fileBytes, std::int64_t& freeBytes)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     DABasePath here;
     return DAOperations::GetSpace(source, here, fileBytes, freeBytes);
 }
 
 int DASession::Compact()
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     DABasePath here;
     const int rc = DAOperations::Compact(source, here);
     ++m_state->generation;  // the file rewritten: every table may have moved, as no authorizer sees
@@ -423,18 +423,18 @@ int DASession::Compact()
 
 int DASession::Insert(DAInsertRequest& request, std::int64_t& rowId)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Insert(source, request, rowId);
 }
 
 int DASession::Update(DAUpdateRequest& request, int& changes)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Update(source, request, changes);
 }
 
 int DASession::Delete(DADeleteRequest& request, int& changes)
 {
-    DASessionCall source(*m_state);
+    DASessionCall source(*m_state, __LINE__);
     return DAOperations::Delete(source, request, changes);
 }

@@ -11,7 +11,7 @@
 
 int DABatchRequest::CheckLocation(DABasePath& request)
 {
-    return DACheckLocation(*this, request, DA_FILE_NAME, "Add", "batch", m_scratch);
+    return DACheckLocation(*this, request, DA_FILE_NAME, "Add", __LINE__, "batch", m_scratch);
 }
 
 template <typename Request, typename Generate>
