@@ -18,6 +18,7 @@
 
 #include <gtest/gtest.h>
 
+#include "DACreateIndexRequest.h"
 #include "DACreateRequest.h"
 #include "DACursor.h"
 #include "DAMutex.h"
@@ -91,9 +92,10 @@ struct Objects {
     std::unique_ptr<DACreateRequest> create;
     std::unique_ptr<DACursor> cursor;
     std::unique_ptr<DAQueryRequest> query;
+    std::unique_ptr<DACreateIndexRequest> index;
 };
 
-enum Container { kData, kWhere, kKeys, kColumns, kOrder };
+enum Container { kData, kWhere, kKeys, kColumns, kOrder, kConditions, kSelect, kGroups, kIndexed, kContainers };
 
 struct Filling {
     const char* name;
@@ -131,6 +133,13 @@ const Filling kFillings[] = {
     {"Cursor_SetData_null", kColumns, [](Objects& o) { o.cursor->SetData("c", nullptr); }, kBadString},
     {"Cursor_Initialize", kColumns, [](Objects& o) { o.cursor->Initialize(); }, nullptr},
     {"SetOrderBy", kOrder, [](Objects& o) { o.query->SetOrderBy("c", true); }, nullptr},
+    {"SetWhere_compare", kConditions, [](Objects& o) { o.upsert->SetWhere("c", DACompare::Less, 2.5); }, nullptr},
+    {"SetWhereIn", kConditions, [](Objects& o) { o.upsert->SetWhereIn("c", {"a"}); }, nullptr},
+    {"SetWhereNull", kConditions, [](Objects& o) { o.upsert->SetWhereNull("c"); }, nullptr},
+    {"AddColumn", kSelect, [](Objects& o) { o.query->AddColumn("c"); }, nullptr},
+    {"AddAggregate", kSelect, [](Objects& o) { o.query->AddAggregate(DAAggregate::Count, nullptr, "n"); }, nullptr},
+    {"AddGroupBy", kGroups, [](Objects& o) { o.query->AddGroupBy("c"); }, nullptr},
+    {"Index_AddColumn", kIndexed, [](Objects& o) { o.index->AddColumn("c", true); }, nullptr},
 };
 
 class NamedLockContract : public ::testing::TestWithParam<Filling> {
@@ -154,13 +163,22 @@ protected:
         m_names[kWhere] = NameIn(*m.upsert);
         m.query->SetOrderBy("o");
         m_names[kOrder] = NameIn(*m.query);
+        m.upsert->SetWhereNull("w");
+        m_names[kConditions] = NameIn(*m.upsert);
+        m.query->AddColumn("s");
+        m_names[kSelect] = NameIn(*m.query);
+        m.query->AddGroupBy("g");
+        m_names[kGroups] = NameIn(*m.query);
+        m.index = std::make_unique<DACreateIndexRequest>();
+        m.index->AddColumn("i");
+        m_names[kIndexed] = NameIn(*m.index);
         EXPECT_NE(m_names[kData], m_names[kWhere]);
         EXPECT_NE(queryData, m_names[kOrder]);
         ASSERT_FALSE(HasFailure());
     }
 
     Objects m;
-    std::string m_names[5];
+    std::string m_names[kContainers];
 };
 
 TEST_P(NamedLockContract, OneLockNamedByTheContainerReleasedOnEveryWayOut)
