@@ -78,6 +78,26 @@ const OperationCase kOperations[] = {
          DASelectRequest r;
          return RUN(t, Select, Make(r, dir, "people"), cursor);
      }},
+    {"same_shapes_other_values",  // a session binds these into the statement it kept
+     [](Target& t, const std::string& dir, DACursor& cursor) {
+         std::string seen;
+         int rc = 0;
+         for (const char* name : {"Kim", "Park", "Nobody", "Kim"}) {
+             DASelectRequest r;
+             rc += RUN(t, Select, Make(r, dir, "contacts", "name", name), cursor);
+             seen += std::to_string(cursor.GetCount()) + " ";
+         }
+         for (int below = 1; below <= 4; ++below) {
+             DAQueryRequest r;
+             At(r, dir, "contacts").SetWhere("_ID", DACompare::Less, below);
+             r.SetLimit(2, below % 2);
+             rc += RUN(t, Query, r, cursor);
+             seen += std::to_string(cursor.GetCount()) + " ";
+         }
+         cursor.SetColumn("counts");
+         cursor.SetData("counts", seen.c_str());
+         return rc;
+     }},
     {"join_select",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAJoinRequest r;

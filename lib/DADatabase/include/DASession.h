@@ -51,14 +51,21 @@ struct DASessionState;
 /// unchanged; no busy handler is set. Its own readers never make a read
 /// wait; rarely, a reader that meets the log's index being rewritten holds
 /// the write lock for an instant, and a write starting then pauses once
-/// under that rule. Readers follow the session's own schema changes at
-/// once; after a schema change made by another connection, the first read
-/// on each reader that meets it fails at its step (the parser's line; the
-/// reader is then replaced). Per-call visits of a file a session holds with
+/// under that rule. Per-call visits of a file a session holds with
 /// the log see every committed row. Close checkpoints the log into the file
 /// and removes it when no other connection has the file open (else the last
 /// one to close does); the file stays in WAL mode, which any SQLite program
 /// reads.
+///
+/// Statements: each connection keeps the last 8 statements it ran by their
+/// shape, the text with its quoted literals taken out; a text of a known
+/// shape has its literals bound as text (which SQLite treats as it treats
+/// the literals) instead of being parsed and planned again. Kept statements
+/// follow schema changes, the session's own and other connections'. Texts
+/// that cannot be split so (a quote or ';' in a table or column name, a
+/// schema statement) run as written; such a read, after a schema change by
+/// another connection, may fail once at its step (the parser's line; the
+/// reader is then replaced). The kept statements take some kilobytes each.
 ///
 /// Not copyable. No exceptions of its own; Open throws std::logic_error for
 /// an incomplete location, std::bad_alloc passes through.

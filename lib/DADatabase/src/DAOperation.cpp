@@ -18,6 +18,11 @@ void DALeaseEnd::operator()(sqlite3* db) const noexcept
     source->Release(db);
 }
 
+void DAStatementEnd::operator()(sqlite3_stmt* stmt) const noexcept
+{
+    source->Finish(stmt);
+}
+
 namespace {
 
 // sqlite3_exec of sql under busy-retry (rows, if any, to callback with
@@ -62,7 +67,7 @@ int RunWrite(DAConnectionSource& source, Request& request, void (DASqlGenerator:
     (DASqlGenerator().*generate)(request, sql);
 
     DAErrorText error;
-    rc = ExecWhileBusy(source, db.get(), sql.c_str(), error);
+    rc = source.Execute(db.get(), sql.c_str(), error);
     if (rc == SQLITE_OK) {
         done(db.get());
         DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "%s SUCCESS[%d]", word, rc);
@@ -93,13 +98,8 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
     std::string sql;
     generate(sql);
 
-    DAStatement stmt;
-    const int rc = DARetryWhileBusy(source, [&] {
-        sqlite3_stmt* handle = nullptr;
-        const int result = sqlite3_prepare(db.get(), sql.c_str(), -1, &handle, nullptr);
-        stmt.reset(handle);
-        return result;
-    });
+    DAStatementLease stmt;
+    const int rc = source.Prepare(db.get(), sql.c_str(), stmt);
     if (rc != SQLITE_OK) {
         DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
                      sqlite3_errmsg(db.get()));
@@ -158,7 +158,7 @@ int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, i
     const char* sql = texts;
     while (rc == SQLITE_OK && step < count) {
         ++step;
-        rc = ExecWhileBusy(source, db, sql, error);
+        rc = source.Execute(db, sql, error);
         sql += std::strlen(sql) + 1;
     }
     if (rc == SQLITE_OK) {
@@ -222,6 +222,26 @@ int RunRead(DAConnectionSource& source, DABasePath& location, const char* sql, s
 const char* const kReadVersion = "PRAGMA user_version";
 
 }  // namespace
+
+int DAConnectionSource::Prepare(sqlite3* db, const char* sql, DAStatementLease& stmt)
+{
+    return DARetryWhileBusy(*this, [&] {
+        sqlite3_stmt* handle = nullptr;
+        const int result = sqlite3_prepare(db, sql, -1, &handle, nullptr);
+        stmt = DAStatementLease(handle, DAStatementEnd{this});
+        return result;
+    });
+}
+
+int DAConnectionSource::Execute(sqlite3* db, const char* sql, DAErrorText& error)
+{
+    return ExecWhileBusy(*this, db, sql, error);
+}
+
+void DAConnectionSource::Finish(sqlite3_stmt* stmt) noexcept
+{
+    sqlite3_finalize(stmt);
+}
 
 int DAOperations::DropTable(DAConnectionSource& source, DADropRequest& request)
 {

@@ -24,6 +24,7 @@
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
 #include "DASelectRequest.h"
+#include "DASqliteHandles.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
@@ -36,6 +37,14 @@ struct DALeaseEnd {
     void operator()(sqlite3* db) const noexcept;
 };
 using DALease = std::unique_ptr<sqlite3, DALeaseEnd>;
+
+// Ends the use of a prepared statement: finalized, or kept by a session
+// for the next statement of its shape.
+struct DAStatementEnd {
+    DAConnectionSource* source = nullptr;
+    void operator()(sqlite3_stmt* stmt) const noexcept;
+};
+using DAStatementLease = std::unique_ptr<sqlite3_stmt, DAStatementEnd>;
 
 // What an operation will do with its connection: a session serialises
 // writers and lets readers run beside them.
@@ -67,6 +76,20 @@ public:
 
     // The busy-retry step, logged under this source's file.
     virtual bool IsRetryLimit(int& count) = 0;
+
+    // Prepares sql on db (a connection this source lent) under busy-retry:
+    // 0 with stmt set, else the code with stmt empty. Here the text itself
+    // with sqlite3_prepare; a session may hand out a kept statement of the
+    // same shape with the text's literals bound.
+    virtual int Prepare(sqlite3* db, const char* sql, DAStatementLease& stmt);
+
+    // Runs sql on db to its end under busy-retry, as sqlite3_exec does:
+    // returns its code, and on failure error holds SQLite's text (or null
+    // when memory ran out).
+    virtual int Execute(sqlite3* db, const char* sql, DAErrorText& error);
+
+    // Ends a statement Prepare handed out; here it is finalized.
+    virtual void Finish(sqlite3_stmt* stmt) noexcept;
 
 private:
     const char* m_file;

@@ -17,6 +17,7 @@
 #include "DAOperation.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
+#include "DAStatementCache.h"
 
 namespace {
 
@@ -28,10 +29,12 @@ constexpr std::size_t kIdleReaders = 4;
 constexpr int kWriterFlags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE | SQLITE_OPEN_NOMUTEX;
 constexpr int kReaderFlags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX;
 
-// A reader connection and the schema generation of the session it last
-// ran at (-1: new, its schema is read at its first statement).
+// A reader connection, its kept statements (released before it closes)
+// and the schema generation of the session it last ran at (-1: new, its
+// schema is read at its first statement).
 struct DAReader {
     DAConnection db;
+    DAStatementCache statements;
     int generation = -1;
 };
 
@@ -52,6 +55,7 @@ struct DASessionState {
 
     std::mutex writeMutex;  // held for a write's whole lease
     DAConnection writer;
+    DAStatementCache writerStatements;  // cleared before the writer closes
 
     std::mutex poolMutex;
     std::vector<DAReader> idle;  // capacity kIdleReaders, so a return never allocates
@@ -133,6 +137,54 @@ public:
 
     bool IsRetryLimit(int& count) override { return DAIsRetryLimit(count, DA_FILE_NAME, __LINE__); }
 
+    // The session's statements are kept by shape (DAStatementCache.h): a
+    // text whose shape was seen on this connection is bound, not parsed
+    // and planned again. Any other text is prepared as it is.
+    int Prepare(sqlite3* db, const char* sql, DAStatementLease& stmt) override
+    {
+        DAStatementCache* cache = CacheOf(db);
+        const int rc =
+            cache != nullptr && DASplitLiterals(sql, m_shape, m_values) ? PrepareShape(db, *cache, stmt) : kAsWritten;
+        return rc != kAsWritten ? rc : DAConnectionSource::Prepare(db, sql, stmt);
+    }
+
+    // A text of a kept shape is stepped to its end as sqlite3_exec would
+    // run it, with exec's code and SQLite's text.
+    int Execute(sqlite3* db, const char* sql, DAErrorText& error) override
+    {
+        DAStatementCache* cache = CacheOf(db);
+        DAStatementLease stmt;
+        int rc =
+            cache != nullptr && DASplitLiterals(sql, m_shape, m_values) ? PrepareShape(db, *cache, stmt) : kAsWritten;
+        if (rc == kAsWritten) {
+            return DAConnectionSource::Execute(db, sql, error);
+        }
+        if (rc == SQLITE_OK) {
+            rc = DARetryWhileBusy(*this, [&] {
+                sqlite3_reset(stmt.get());  // after a busy step; keeps the bindings
+                return sqlite3_step(stmt.get());
+            });
+            while (rc == SQLITE_ROW) {
+                rc = sqlite3_step(stmt.get());
+            }
+        }
+        error.reset();
+        if (rc == SQLITE_DONE) {
+            return SQLITE_OK;
+        }
+        error.reset(sqlite3_mprintf("%s", sqlite3_errmsg(db)));
+        return rc;
+    }
+
+    void Finish(sqlite3_stmt* stmt) noexcept override
+    {
+        if (stmt == std::exchange(m_shaped, nullptr)) {
+            CacheOf(sqlite3_db_handle(stmt))->Put(m_shape, stmt);
+        } else {
+            sqlite3_finalize(stmt);
+        }
+    }
+
     // Opens path with flags under busy-retry; on failure logs OpenDB's line
     // under func and leaves db empty.
     int OpenConnection(const std::string& path, int flags, const char* func, DAConnection& db)
@@ -178,9 +230,56 @@ public:
     }
 
 private:
+    // PrepareShape's result when the text is to be prepared as it is.
+    static constexpr int kAsWritten = -1;
+
+    // The kept statements of db, if this source lent it.
+    DAStatementCache* CacheOf(sqlite3* db)
+    {
+        return db == m_state.writer.get() ? &m_state.writerStatements
+            : db == m_reader.db.get()     ? &m_reader.statements
+                                          : nullptr;
+    }
+
+    // The statement of m_shape on db, kept or prepared now (sqlite3_prepare_v2,
+    // under busy-retry), with m_values bound: 0 with stmt set, or the
+    // failure's code; kAsWritten when SQLite does not take the shape (a
+    // literal where no parameter may stand), so that the text runs as it is
+    // and fails, if it does, as it would anyway.
+    int PrepareShape(sqlite3* db, DAStatementCache& cache, DAStatementLease& stmt)
+    {
+        sqlite3_stmt* handle = cache.Take(m_shape);
+        int rc = SQLITE_OK;
+        if (handle == nullptr) {
+            rc = DARetryWhileBusy(*this, [&] {
+                sqlite3_finalize(handle);
+                handle = nullptr;
+                return sqlite3_prepare_v2(db, m_shape.c_str(), -1, &handle, nullptr);
+            });
+        }
+        m_shaped = handle;
+        stmt = DAStatementLease(handle, DAStatementEnd{this});
+        if (rc != SQLITE_OK) {
+            return rc == SQLITE_BUSY || rc == SQLITE_NOMEM ? rc : kAsWritten;
+        }
+        // The values outlive the statement's use: the cache clears the
+        // bindings when it takes the statement back.
+        for (std::size_t i = 0; rc == SQLITE_OK && i < m_values.size(); ++i) {
+            const DALiteral& value = m_values[i];
+            const int index = static_cast<int>(i + 1);
+            rc = value.integer ? sqlite3_bind_int64(handle, index, std::strtoll(value.text.c_str(), nullptr, 10))
+                               : sqlite3_bind_text(handle, index, value.text.data(),
+                                                   static_cast<int>(value.text.size()), SQLITE_STATIC);
+        }
+        return rc;
+    }
+
     DASessionState& m_state;
     DAReader m_reader;  // the one this operation holds, if any
     std::string m_scratch[4];
+    std::string m_shape;  // the shape and literals of the last text split
+    std::vector<DALiteral> m_values;
+    sqlite3_stmt* m_shaped = nullptr;  // the statement of m_shape handed out
 };
 
 // A session operation's source, holding the session's life lock shared for
@@ -257,6 +356,7 @@ int DASession::Open(DABasePath& location)
     const std::unique_lock<std::shared_mutex> life(m_state->life);
     DASessionState& state = *m_state;
     state.idle.clear();
+    state.writerStatements.Clear();
     state.writer.reset();
     DASqlGenerator().GetDBPath(dir, file, state.path);
     state.idle.reserve(kIdleReaders);
@@ -310,6 +410,7 @@ void DASession::Close()
     // The readers first: the writer, closed last, checkpoints the log into
     // the file and removes it.
     m_state->idle.clear();
+    m_state->writerStatements.Clear();
     m_state->writer.reset();
 }
 

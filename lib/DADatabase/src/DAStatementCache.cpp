@@ -1,0 +1,111 @@
+#include "DAStatementCache.h"
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+
+namespace {
+
+constexpr std::size_t kMaxLiterals = 999;
+
+bool IsNameByte(unsigned char byte)
+{
+    return (byte >= 'a' && byte <= 'z') || (byte >= 'A' && byte <= 'Z') || (byte >= '0' && byte <= '9') ||
+        byte == '_' || byte >= 0x80;
+}
+
+bool StartsWithDml(const char* sql)
+{
+    for (const char* verb : {"SELECT ", "INSERT ", "UPDATE ", "DELETE "}) {
+        if (std::strncmp(sql, verb, std::strlen(verb)) == 0) {
+            return true;
+        }
+    }
+    return false;
+}
+
+}  // namespace
+
+bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>& values)
+{
+    if (!StartsWithDml(sql)) {
+        return false;
+    }
+    shape.clear();
+    values.clear();
+    for (const char* c = sql; *c != '\0';) {
+        const bool glued = c != sql && (IsNameByte(static_cast<unsigned char>(c[-1])) || c[-1] == '.');
+        DALiteral literal;
+        if (*c == '\'') {
+            if (glued) {  // x'00' is a blob
+                return false;
+            }
+            for (++c;; ++c) {
+                if (*c == '\0') {
+                    return false;  // unterminated: SQLite says so
+                }
+                if (*c == '\'' && *++c != '\'') {
+                    break;
+                }
+                literal.text += *c;
+            }
+        } else if (*c >= '0' && *c <= '9' && !glued) {
+            // The whole number: digits, a fraction, an exponent.
+            const char* end = c + std::strspn(c, "0123456789");
+            literal.integer = *end != '.' && *end != 'e' && *end != 'E';
+            end += *end == '.' ? 1 + std::strspn(end + 1, "0123456789") : 0;
+            if (*end == 'e' || *end == 'E') {
+                ++end;
+                end += *end == '+' || *end == '-' ? 1 : 0;
+                end += std::strspn(end, "0123456789");
+            }
+            literal.text.assign(c, end);
+            errno = 0;
+            std::strtoll(c, nullptr, 10);
+            if (!literal.integer || errno == ERANGE) {
+                shape += literal.text;
+                c = end;
+                continue;
+            }
+            c = end;
+        } else if (std::strchr(";\"`[?:@$", *c) != nullptr || (c[0] == '-' && c[1] == '-') ||
+                   (c[0] == '/' && c[1] == '*')) {
+            return false;
+        } else {
+            shape += *c++;
+            continue;
+        }
+        if (IsNameByte(static_cast<unsigned char>(*c)) || values.size() == kMaxLiterals) {
+            return false;  // a literal glued to a name, or too many
+        }
+        values.push_back(std::move(literal));
+        shape += '?';
+    }
+    return true;
+}
+
+sqlite3_stmt* DAStatementCache::Take(const std::string& shape)
+{
+    for (auto entry = m_entries.begin(); entry != m_entries.end(); ++entry) {
+        if (entry->first == shape) {
+            sqlite3_stmt* stmt = entry->second.release();
+            m_entries.erase(entry);
+            return stmt;
+        }
+    }
+    return nullptr;
+}
+
+void DAStatementCache::Put(const std::string& shape, sqlite3_stmt* stmt) noexcept
+{
+    DAStatement owned(stmt);
+    sqlite3_reset(stmt);
+    sqlite3_clear_bindings(stmt);
+    try {
+        if (m_entries.size() == kCapacity) {
+            m_entries.pop_back();
+        }
+        m_entries.emplace(m_entries.begin(), shape, std::move(owned));
+    } catch (...) {  // std::bad_alloc: the statement goes (owned finalizes it)
+    }
+}

@@ -1,0 +1,60 @@
+#ifndef DASTATEMENTCACHE_H
+#define DASTATEMENTCACHE_H
+
+// A held connection's prepared statements, kept by their shape: the
+// generated text with every text literal replaced by a parameter. A
+// statement of a known shape is then bound (its literals as text, which
+// SQLite treats as it treats the literals) instead of parsed and planned
+// again.
+
+#include <cstddef>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include <sqlite3.h>
+
+#include "DASqliteHandles.h"
+
+// A literal taken out of a text: a quoted text (quotes undoubled), or an
+// unquoted integer that fits 64 bits, bound as such.
+struct DALiteral {
+    std::string text;
+    bool integer = false;
+};
+
+// Splits the NUL-terminated sql into shape (each literal replaced by ?) and
+// values, for a single SELECT, INSERT, UPDATE or DELETE whose every quote
+// opens a literal. Other numbers (reals, integers beyond 64 bits) stay in
+// the shape, as SQLite's reading of them is not repeated here. Returns
+// false, with shape and values unspecified, for any other text: another
+// statement (schema statements take no parameters), an unterminated
+// literal, a ';', a comment, a quoted name, a parameter of its own, a
+// literal glued to a name (x'00' is a blob), more than 999 literals. Such
+// texts run as they are.
+bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>& values);
+
+// Up to kCapacity statements of one connection by shape, the most recently
+// used first. A statement taken out is the caller's until it is put back,
+// so one connection never runs one statement twice at once. Destroy (or
+// Clear) the cache before closing its connection.
+class DAStatementCache {
+public:
+    static constexpr std::size_t kCapacity = 8;
+
+    // The statement of shape, removed from the cache; null when none is
+    // kept.
+    sqlite3_stmt* Take(const std::string& shape);
+
+    // Keeps stmt (reset, its bindings cleared) as shape's, finalizing the
+    // least recently used one beyond the capacity. Never throws: when
+    // memory runs out the statement is finalized instead.
+    void Put(const std::string& shape, sqlite3_stmt* stmt) noexcept;
+
+    void Clear() { m_entries.clear(); }
+
+private:
+    std::vector<std::pair<std::string, DAStatement>> m_entries;
+};
+
+#endif  // DASTATEMENTCACHE_H

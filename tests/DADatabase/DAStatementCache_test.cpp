@@ -1,0 +1,67 @@
+#include "DAStatementCache.h"
+
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+// A generated text, its shape and its literals, integers marked "#" (an
+// empty shape: the text is not split).
+struct SplitCase {
+    const char* sql;
+    const char* shape;
+    std::vector<std::string> values;
+};
+
+const SplitCase kSplits[] = {
+    {"SELECT * FROM t WHERE a='1' AND b='x''y'", "SELECT * FROM t WHERE a=? AND b=?", {"1", "x'y"}},
+    {"INSERT OR REPLACE INTO t (a, b) VALUES ('', '%n;--')",
+     "INSERT OR REPLACE INTO t (a, b) VALUES (?, ?)",
+     {"", "%n;--"}},
+    {"UPDATE t SET v = '''' WHERE k IN ('a', 'b') AND ts<17",
+     "UPDATE t SET v = ? WHERE k IN (?, ?) AND ts<?",
+     {"'", "a", "b", "#17"}},
+    {"SELECT c0 FROM t WHERE r>=2.5 AND e<1e+100 AND u<18446744073709551615 ORDER BY c0 LIMIT -1 OFFSET 20",
+     "SELECT c0 FROM t WHERE r>=2.5 AND e<1e+100 AND u<18446744073709551615 ORDER BY c0 LIMIT -? OFFSET ?",
+     {"#1", "#20"}},
+    {"DELETE  FROM t", "DELETE  FROM t", {}},
+    {"CREATE INDEX IF NOT EXISTS i ON t (a)", "", {}},
+    {"ALTER TABLE t ADD COLUMN c TEXT DEFAULT '0'", "", {}},
+    {"SELECT * FROM t WHERE a='1'; DROP TABLE t", "", {}},
+    {"SELECT * FROM t WHERE a=x'00'", "", {}},
+    {"SELECT * FROM t WHERE a=0x1F", "", {}},
+    {"SELECT * FROM \"t\" WHERE a='1'", "", {}},
+    {"SELECT * FROM t WHERE a='open", "", {}},
+    {"SELECT * FROM t WHERE a=? -- note", "", {}},
+    {"SELECT * FROM t /* note */", "", {}},
+};
+
+TEST(DASplitLiterals, TakesOutTheLiteralsOfPlainDmlOnly)
+{
+    for (const SplitCase& c : kSplits) {
+        std::string shape;
+        std::vector<DALiteral> values;
+        const bool split = DASplitLiterals(c.sql, shape, values);
+        EXPECT_EQ(*c.shape != '\0', split) << c.sql;
+        if (split) {
+            std::vector<std::string> texts;
+            for (const DALiteral& value : values) {
+                texts.push_back((value.integer ? "#" : "") + value.text);
+            }
+            EXPECT_EQ(c.shape, shape);
+            EXPECT_EQ(c.values, texts);
+        }
+    }
+    std::string in = "SELECT * FROM t WHERE k IN ('0'";
+    for (int i = 1; i < 999; ++i) {
+        in += ", '" + std::to_string(i) + "'";
+    }
+    std::string shape;
+    std::vector<DALiteral> values;
+    EXPECT_TRUE(DASplitLiterals((in + ")").c_str(), shape, values));
+    EXPECT_FALSE(DASplitLiterals((in + ", '999')").c_str(), shape, values)) << "more literals than parameters";
+}
+
+}  // namespace
