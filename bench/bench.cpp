@@ -85,20 +85,26 @@ int RawExec(const std::string& path, const std::string& sql)
     return OnFile(path, [&](sqlite3* db) { return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr); });
 }
 
-int RawSelectOn(sqlite3* db, const std::string& sql, Columns& columns)
+int RawStepCopy(sqlite3_stmt* stmt, Columns& columns)
 {
-    sqlite3_stmt* stmt = nullptr;
-    const int rc = sqlite3_prepare_v2(db, sql.c_str(), -1, &stmt, nullptr);
     const int count = sqlite3_column_count(stmt);
     columns.assign(static_cast<std::size_t>(count), {});
-    while (rc == SQLITE_OK && sqlite3_step(stmt) == SQLITE_ROW) {
+    while (sqlite3_step(stmt) == SQLITE_ROW) {
         for (int i = 0; i < count; ++i) {
             const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(stmt, i));
             columns[static_cast<std::size_t>(i)].emplace_back(text != nullptr ? text : "");
         }
     }
+    return sqlite3_reset(stmt);
+}
+
+int RawSelectOn(sqlite3* db, const std::string& sql, Columns& columns)
+{
+    sqlite3_stmt* stmt = nullptr;
+    const int rc = sqlite3_prepare_v2(db, sql.c_str(), -1, &stmt, nullptr);
+    const int stepped = rc == SQLITE_OK ? RawStepCopy(stmt, columns) : rc;
     sqlite3_finalize(stmt);
-    return rc;
+    return stepped;
 }
 
 int RawSelect(const std::string& path, const std::string& sql, Columns& columns)

@@ -14,6 +14,7 @@
 
 class DACursor;
 struct sqlite3;
+struct sqlite3_stmt;
 
 namespace bench {
 
@@ -67,6 +68,8 @@ using Columns = std::vector<std::vector<std::string>>;
 int RawExec(const std::string& path, const std::string& sql);
 int RawSelect(const std::string& path, const std::string& sql, Columns& columns);
 int RawSelectOn(sqlite3* db, const std::string& sql, Columns& columns);
+// Steps a prepared stmt to its end, copying every value, then resets it; returns the reset's code.
+int RawStepCopy(sqlite3_stmt* stmt, Columns& columns);
 int SqliteCppSelect(const std::string& path, const std::string& sql, Columns& columns);
 // Ops checking a select: 0, its error code, or -1 when it does not hold rows rows (select into a fresh
 // cursor; sql on path through RawSelect).

@@ -32,13 +32,15 @@ SECTIONS = [
      "thread); 10,000,000 distinct lock names coming and going (`growth_bytes`: the heap they leave behind)."),
     ("Conditions", ["cond"], "100,000 events, `ts` indexed: a retention delete of the oldest 20 % by a range "
      "(`equality`: read all, filter, a batch of deletes by key), a count per type, a keyset page of 50 (`offset`: "
-     "the same page at offset 50,000); raw runs the same statement text."),
+     "the same page at offset 50,000; `session`, `sessionoffset`: both pages through a `DASession` holding the "
+     "file); raw runs the same statement text."),
     ("Schema", ["schema"], "A column added to a 100,000-row table: `AddColumn` against the same `ALTER TABLE` raw "
      "and `rewrite` (every row copied into a new table with the column, in one transaction); `Migrate` of a file "
      "already at the step's version against `Select` of an empty table; `Compact` after deleting the older half of "
      "100,000 rows (`before_bytes`, `after_bytes`: the file)."),
     ("Sessions", ["session"], "A `DASession` held open (lib) against the same request per call (percall, a "
-     "rollback-journal file) and a raw connection held open in WAL mode running the same text (raw); `Readers1`/"
+     "rollback-journal file) and a raw connection held open in WAL mode running the same text (raw) or reusing "
+     "one prepared statement (rawkept); `Readers1`/"
      "`Readers2`: reads by key beside a writer going flat out (rows: the reads of one second). `held_bytes`: the "
      "heap an open session holds beyond SQLite's page cache."),
 ]
@@ -91,6 +93,8 @@ TARGETS = [
     *both("count per type, {l}: lib / raw", "cond/count/{l}/lib", "raw", "<=", 1.3),
     *both("keyset page, {l}: lib / raw", "cond/keyset/{l}/lib", "raw", "<=", 1.8),
     *both("keyset page, {l}: offset / keyset", "cond/keyset/{l}/offset", "lib", ">=", 20),
+    *both("keyset page through a session, {l}: offset / keyset", "cond/keyset/{l}/sessionoffset", "session", ">=",
+          20),
     *both("`AddColumn`, 100k rows, {l}: lib / raw", "schema/AddColumn100000/{l}/lib", "raw", "<=", 1.2),
     *both("`AddColumn`, 100k rows, {l}: rewrite / lib", "schema/AddColumn100000/{l}/rewrite", "lib", ">=", 100),
     *both("`Migrate` up to date, {l}: lib / empty `Select`", "schema/MigrateUpToDate/{l}/lib", "select", "<=", 2),
