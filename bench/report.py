@@ -41,7 +41,7 @@ SECTIONS = [
     ("Sessions", ["session"], "A `DASession` held open (lib) against the same request per call (percall, a "
      "rollback-journal file) and a raw connection held open in WAL mode running the same text (raw) or reusing "
      "one prepared statement (rawkept); `Readers1`/"
-     "`Readers2`: reads by key beside a writer going flat out (rows: the reads of one second). `held_bytes`: the "
+     "`Readers2`: pages of 50 rows read beside a writer going flat out (rows: the reads of one second). `held_bytes`: the "
      "heap an open session holds beyond SQLite's page cache."),
 ]
 
