@@ -333,6 +333,41 @@ INSTANTIATE_TEST_SUITE_P(Every, IoFaults, ::testing::ValuesIn(kIoCases),
 
 using Faults = TempDirTest;
 
+// A session on a disk that fills up: each write fails with 13 and one line
+// (a delete too: its log needs room, which only a size budget keeps), Close
+// works, and once there is room again the file holds every acknowledged row.
+TEST_F(Faults, SessionOnAFullDiskFailsCleanlyAndKeepsTheFile)
+{
+    RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT)");
+    DASession session;
+    DABasePath location;
+    ASSERT_EQ(0, session.Open(At(location, Dir())));
+    const auto upsert = [&](int k) {
+        DAUpsertRequest request;
+        At(request, Dir(), "t").SetData("k", k);
+        request.SetData("v", std::string(500, 'v').c_str());
+        return session.Upsert(request);
+    };
+    dlog_set_sink(&dlog_discard_sink, nullptr);
+    for (int k = 0; k < 20; ++k) {
+        ASSERT_EQ(0, upsert(k));
+    }
+    sqlite3_vfs* vfs = sqlite3_vfs_find(nullptr);
+    g_pwrite64 = vfs->xGetSystemCall(vfs, "pwrite64");
+    vfs->xSetSystemCall(vfs, "pwrite64", reinterpret_cast<sqlite3_syscall_ptr>(&FullDiskPwrite64));
+    LogCapture log;
+    DADeleteRequest remove;
+    At(remove, Dir(), "t").SetWhere("k", DACompare::Less, 10);
+    EXPECT_EQ(13, upsert(20));
+    EXPECT_EQ(13, session.Delete(remove));
+    session.Close();
+    vfs->xSetSystemCall(vfs, "pwrite64", g_pwrite64);
+    EXPECT_EQ((Strings{Logged(6, "DASession.cpp", "Upsert", "Upsert FAILED[13]: database or disk is full"),
+                       Logged(6, "DASession.cpp", "Delete", "delete FAILED[13]: database or disk is full")}),
+              Described(log));
+    EXPECT_EQ("20|ok", RawDb(PathOf("t.db")).Query("SELECT count(*), (SELECT * FROM pragma_integrity_check) FROM t"));
+}
+
 TEST_F(Faults, KilledWriterLosesNoAcknowledgedRow)
 {
     RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT)");

@@ -100,7 +100,11 @@ public:
     /// and truncated when it has grown past twice that. File and log
     /// together thus stay within the budget plus a margin of a quarter of
     /// it, plus the pages of the one transaction being committed (a large
-    /// batch holds all of its pages in the log until its commit).
+    /// batch holds all of its pages in the log until its commit). On a disk
+    /// that is full already every write fails with 13, a Delete too (its
+    /// log needs room), and Close leaves the log for the next opener; the
+    /// file keeps every acknowledged row. Set a budget below the free space
+    /// where the disk may fill, so that deletes keep working.
     void SetWal(bool wal);
     void SetSyncOnCommit(bool sync);
     void SetSizeLimit(std::int64_t bytes);
