@@ -2,10 +2,10 @@
 // write, query, join, list a table sorted and a page at a time, store a
 // 64-bit time stamp, name columns at run time, check and drop, write in a
 // batch, keep an event journal for a week (retention by a range, counts per
-// type, keyset pages), upgrade a schema in versioned steps and compact the
-// file, printing each step's result code, the statement the library
-// generated, every result as a table, and the library's own log lines as
-// they are written.
+// type, keyset pages), upgrade a schema in versioned steps, compact the
+// file and run requests through a session that holds it open, printing each
+// step's result code, the statement the library generated, every result as
+// a table, and the library's own log lines as they are written.
 //
 //   ulo_db_demo [directory]     (default: /tmp/ulo_db_demo, created if missing)
 //
@@ -25,6 +25,7 @@
 
 #include "DAColumnName.h"
 #include "DADatabase.h"
+#include "DASession.h"
 #include "DASqlGenerator.h"
 #include "dlog.h"
 
@@ -557,6 +558,42 @@ void Retention(DADatabase& db, DASqlGenerator& generator, const char* dir)
     Write(db, "Drop journal", drop, &DASqlGenerator::GetDropTableSql, &DADatabase::DropTable);
 }
 
+// The same requests through a session that holds the file open: no
+// location on the requests, the write-ahead log on, and the second select
+// of the same shape runs the statement the first one prepared.
+void Session(DASqlGenerator& generator, const char* dir)
+{
+    DABasePath location;
+    location.SetPath(dir, kFile);
+    DASession session;
+    Step("Open a session on the file", "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL");
+    Result(session.Open(location), SQLITE_OK);
+
+    DAUpsertRequest upsert;  // no location: the session's file
+    upsert.SetTable("contacts");
+    upsert.SetData(kPhone, "010-5555");
+    upsert.SetData(kName, "Yoon");
+    upsert.SetData(kGroupId, 2);
+    std::string sql;
+    generator.GetUpsertSql(upsert, sql);
+    Step("Session: upsert a contact", sql);
+    Result(session.Upsert(upsert), SQLITE_OK);
+
+    for (const char* phone : {"010-5555", "010-1111"}) {
+        DASelectRequest select;
+        select.SetTable("contacts");
+        select.SetWhere(kPhone, phone);
+        generator.GetSelectSql(select, sql);
+        Step("Session: select a contact by phone", sql);
+        DACursor cursor;
+        Result(session.Select(select, cursor), SQLITE_OK);
+        PrintCursor(cursor);
+    }
+    Step("Close the session: the log goes back into the file", "(a checkpoint, then the log removed)");
+    session.Close();
+    std::printf("   open: %s\n", session.IsOpen() ? "yes" : "no");
+}
+
 }  // namespace
 
 int main(int argc, char** argv)
@@ -583,6 +620,7 @@ int main(int argc, char** argv)
     Retention(db, generator, dir);
     Upgrade(db, generator, dir);
     Space(db, generator, dir);
+    Session(generator, dir);
 
     std::printf("\n%s\n", g_unexpected == 0 ? "Every step gave the expected result." : "Some steps failed.");
     return g_unexpected == 0 ? 0 : 1;
