@@ -241,8 +241,8 @@ const SqlCase kCases[] = {
         Q(r).AddColumn("type"), Q(r).AddAggregate(DAAggregate::Count, nullptr, "n");
         Q(r).AddAggregate(DAAggregate::Max, "ts", "newest"), Q(r).AddGroupBy("type"), Q(r).SetOrderBy("n", true);
         Q(r).SetLimit(5), r.SetWhere("ts", DACompare::GreaterEqual, 5); }},
-    {kQuery, "t", {}, {}, "SELECT COUNT(v) AS x, MIN(v) AS x, SUM(v) AS x, AVG(v) AS x FROM t GROUP BY a, b.c",
-     [](DABaseSet& r) { Q(r).AddAggregate(DAAggregate::Count, "v", "x"), Q(r).AddAggregate(DAAggregate::Min, "v", "x");
+    {kQuery, "t", {}, {}, "SELECT COUNT(v) AS x, MIN(t.v) AS x, SUM(v) AS x, AVG(v) AS x FROM t GROUP BY a, b.c",
+     [](DABaseSet& r) { Q(r).AddAggregate(DAAggregate::Count, "v", "x"), Q(r).AddAggregate(DAAggregate::Min, "t.v", "x");
         Q(r).AddAggregate(DAAggregate::Sum, "v", "x"), Q(r).AddAggregate(DAAggregate::Avg, "v", "x");
         Q(r).AddGroupBy("a"), Q(r).AddGroupBy("b.c"); }},
     {kInsert, kContacts, {{kPhone, "010"}, {kName, "Kim's"}}, {},

@@ -251,11 +251,8 @@ private:
         sqlite3_stmt* handle = cache.Take(m_shape);
         int rc = SQLITE_OK;
         if (handle == nullptr) {
-            rc = DARetryWhileBusy(*this, [&] {
-                sqlite3_finalize(handle);
-                handle = nullptr;
-                return sqlite3_prepare_v2(db, m_shape.c_str(), -1, &handle, nullptr);
-            });
+            // A failed preparation leaves handle null.
+            rc = DARetryWhileBusy(*this, [&] { return sqlite3_prepare_v2(db, m_shape.c_str(), -1, &handle, nullptr); });
         }
         m_shaped = handle;
         stmt = DAStatementLease(handle, DAStatementEnd{this});

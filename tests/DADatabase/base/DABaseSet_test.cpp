@@ -85,7 +85,8 @@ TEST(DABaseSet, ListedConditionsRefuseWhatIsNotPlainAndCopyNames)
     DABaseSet set;
     LogCapture log;
     Strings expected;
-    for (const char* bad : {static_cast<const char*>(nullptr), "", "1ts", "ts;--", "a b", "a.b.c", "t.", "ts'"}) {
+    for (const char* bad :
+         {static_cast<const char*>(nullptr), "", "1ts", "0ts", "ts;--", "a b", "a.b.c", "t.", "ts'"}) {
         set.SetWhere(bad, DACompare::Less, 1);
         set.SetWhereIn(bad, {});
         set.SetWhereNull(bad);
