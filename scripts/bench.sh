@@ -3,7 +3,7 @@
 # in docs/benchmarks.md (bench/README.md says how cases, targets and report
 # sections are added):
 #
-#   scripts/bench.sh                 # everything, about 6 minutes on 2 cores
+#   scripts/bench.sh                 # everything, about 5 minutes on 2 cores
 #   BUILD_DIR=/path scripts/bench.sh # another build directory
 #   REPETITIONS=5 scripts/bench.sh   # repetitions per case (default 3; writes take 9)
 #
