@@ -1,16 +1,55 @@
 // libFuzzer target: fills every request and a cursor from the input,
-// generates every statement, and moves through and reads the cursor.
+// generates every statement, and moves through and reads the cursor; every
+// statement, and the input's last text, is split as a session would keep
+// it, and must come back whole from its shape and literals.
 #include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <iterator>
 #include <string>
+#include <vector>
 
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include "DACursor.h"
 #include "DASqlGenerator.h"
+#include "DAStatementCache.h"
 #include "dlog.h"
+
+namespace {
+
+// A text that splits must be its shape with the literals put back.
+void CheckSplit(const std::string& sql)
+{
+    std::string shape;
+    std::vector<DALiteral> values;
+    if (!DASplitLiterals(sql.c_str(), shape, values)) {
+        return;
+    }
+    std::string back;
+    std::size_t next = 0;
+    for (const char c : shape) {
+        if (c != '?') {
+            back += c;
+            continue;
+        }
+        const DALiteral& value = values.at(next++);
+        if (value.integer) {
+            back += value.text;
+            continue;
+        }
+        back += '\'';
+        for (const char v : value.text) {
+            back += v == '\'' ? "''" : std::string(1, v);
+        }
+        back += '\'';
+    }
+    if (back != sql.substr(0, sql.find('\0')) || next != values.size()) {
+        __builtin_trap();
+    }
+}
+
+}  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size)
 {
@@ -25,7 +64,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     DACreateRequest create;
     DADropRequest drop;
     DACursor cursor;
-    DABaseSet* const sets[] = {&upsert, &update, &remove, &select, &join};
+    DAQueryRequest query;
+    DAInsertRequest insert;
+    DABaseSet* const sets[] = {&upsert, &update, &remove, &select, &join, &query, &insert};
     std::string text;
     const char* t = "";
     const char* c = "";
@@ -40,13 +81,25 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         [&] { cursor.SetColumn(input.ConsumeBool() ? c : t), cursor.SetData(c, t); },
         [&] { cursor.MoveToPosition(input.ConsumeIntegral<int>()), cursor.MoveToNext(), cursor.MoveToPrev(); },
         [&] { input.ConsumeBool() ? cursor.MoveToFirst() : cursor.MoveToLast(); },
+        [&] {
+            const auto op = static_cast<DACompare>(input.ConsumeIntegralInRange(0, 6));
+            set->SetWhere(t, op, c), set->SetWhere(c, op, input.ConsumeIntegral<std::int64_t>());
+            set->SetWhere(c, op, input.ConsumeFloatingPoint<double>()), set->SetWhereIn(c, {t, c});
+            set->SetWhereNull(input.ConsumeBool() ? c : t, input.ConsumeBool());
+        },
+        [&] {
+            const auto function = static_cast<DAAggregate>(input.ConsumeIntegralInRange(0, 4));
+            query.AddColumn(t), query.AddAggregate(function, input.ConsumeBool() ? nullptr : t, c);
+            query.AddGroupBy(t), query.SetOrderBy(t), query.SetLimit(input.ConsumeIntegral<int>(), number);
+            query.SetTable(t), insert.SetTable(t), insert.SetIgnoreExisting(input.ConsumeBool());
+        },
         [&] { cursor.GetDouble(t, real), cursor.GetInt(c, number), cursor.GetString(c, text); },  // t is text: last
     };
     while (silent && input.remaining_bytes() > 0) {
         text = input.ConsumeRandomLengthString(40);
         t = text.c_str();
         c = kColumns[input.ConsumeIntegralInRange<std::size_t>(0, 3)];
-        set = sets[input.ConsumeIntegralInRange<std::size_t>(0, 4)];
+        set = sets[input.ConsumeIntegralInRange<std::size_t>(0, std::size(sets) - 1)];
         actions[input.ConsumeIntegralInRange<std::size_t>(0, std::size(actions) - 1)]();
     }
     DASqlGenerator generator;
@@ -54,5 +107,13 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     generator.GetDBPath(text, text, sql), generator.GetCheckTableSql(text, sql), generator.GetDropTableSql(drop, sql);
     generator.GetCreateTableSql(create, sql), generator.GetSelectSql(select, sql), generator.GetJoinSql(join, sql);
     generator.GetUpsertSql(upsert, sql), generator.GetUpdateSql(update, sql), generator.GetDeleteSql(remove, sql);
+    CheckSplit(text);
+    std::string statements[5];
+    generator.GetQuerySql(query, statements[0]), generator.GetInsertSql(insert, statements[1]);
+    generator.GetSelectSql(select, statements[2]), generator.GetUpdateSql(update, statements[3]);
+    generator.GetDeleteSql(remove, statements[4]);
+    for (const std::string& statement : statements) {
+        CheckSplit(statement);
+    }
     return 0;
 }
