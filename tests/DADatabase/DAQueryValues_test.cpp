@@ -22,6 +22,7 @@ const std::tuple<std::vector<const char*>, int, int, const char*> kTexts[] = {
     {{}, -100, 0, ""},
     {{"-phone", "name", "-_ID"}, -100, 0, " ORDER BY phone DESC, name, _ID DESC"},
     {{}, 10, 0, " LIMIT 10"},
+    {{}, 0, 0, " LIMIT 0"},  // no rows at all
     {{}, 0, 1, " LIMIT 0 OFFSET 1"},
     {{}, 10, -3, " LIMIT 10"},  // a negative offset counts as 0
     {{}, -5, 20, " LIMIT -1 OFFSET 20"},  // no limit, skip 20

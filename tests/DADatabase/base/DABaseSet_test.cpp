@@ -100,7 +100,7 @@ TEST(DABaseSet, ListedConditionsRefuseWhatIsNotPlainAndCopyNames)
         set.SetWhere("v", DACompare::Equal, number);
         expected.push_back(Logged(6, "DABaseSet.cpp", "SetWhere", "INVALID NUMBER, CONDITION NOT STORED"));
     }
-    std::string name = "é_1.ts";
+    std::string name = "é_Az09.aZ";  // every edge of the name bytes
     const std::string big(10 << 20, '\'');
     set.SetWhere(name.c_str(), DACompare::Like, "%n%s'");
     set.SetWhere("big", DACompare::Equal, big.c_str());
@@ -108,7 +108,7 @@ TEST(DABaseSet, ListedConditionsRefuseWhatIsNotPlainAndCopyNames)
     std::vector<DABaseSet::Condition> listed;
     set.GetConditions(listed);
     ASSERT_EQ(2U, listed.size());
-    EXPECT_EQ("é_1.ts", listed[0].column);
+    EXPECT_EQ("é_Az09.aZ", listed[0].column);
     EXPECT_EQ((std::vector<std::string>{"%n%s'"}), listed[0].values);
     EXPECT_EQ(big, listed[1].values.at(0));
     EXPECT_EQ(expected, Described(log));
