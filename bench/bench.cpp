@@ -19,47 +19,20 @@
 namespace bench {
 
 namespace {
-std::vector<CaseFn>& Registry()
-{
-    static std::vector<CaseFn> functions;
-    return functions;
-}
-
-// Opens path, runs run on it and closes it again.
-int OnFile(const std::string& path, const std::function<int(sqlite3*)>& run)
-{
-    sqlite3* db = nullptr;
-    const int rc = sqlite3_open(path.c_str(), &db);
-    const int result = rc == SQLITE_OK ? run(db) : rc;
-    sqlite3_close(db);
-    return result;
-}
-
 bool CreateQueryDatabase(const std::string& path)
 {
     const std::string label = "'item-' || ((i * 7919) % 1000003)";
     std::string sql = "BEGIN;";
-    for (const int rows : SelectSizes()) {
-        sql += TableSql(SelectTable(rows), kRowColumns, rows, "i + 1, (i * 37) % 100003, i * 0.25 + 0.125, " + label);
+    for (const int rows : selectSizes) {
+        sql += TableSql("sel_" + std::to_string(rows), kRowColumns, rows,
+                        "i + 1, (i * 37) % 100003, i * 0.25 + 0.125, " + label);
     }
-    sql += TableSql("jr", "gkey INTEGER PRIMARY KEY, gname TEXT", kJoinGroups, "i, 'group-' || i");
+    sql += TableSql("jr", "gkey INTEGER PRIMARY KEY, gname TEXT", 1000, "i, 'group-' || i");
     sql += TableSql("jl", "id INTEGER PRIMARY KEY, gid INTEGER, price REAL, label TEXT", kJoinRows,
-                    "i + 1, (i * 13) % " + std::to_string(kJoinGroups) + ", i * 0.5 + 0.25, " + label);
+                    "i + 1, (i * 13) % 1000, i * 0.5 + 0.25, " + label);
     return RawExec(path, sql + "COMMIT;") == SQLITE_OK;
 }
 }  // namespace
-
-std::set<int>& SelectSizes()
-{
-    static std::set<int> sizes;
-    return sizes;
-}
-
-int Cases(CaseFn fn)
-{
-    Registry().push_back(fn);
-    return 0;
-}
 
 benchmark::internal::Benchmark* Add(const std::string& name, Op op, Counters counters, Op untimed)
 {
@@ -78,6 +51,66 @@ benchmark::internal::Benchmark* Add(const std::string& name, Op op, Counters cou
         state.counters.insert(counters.begin(), counters.end());
     };
     return benchmark::RegisterBenchmark(name.c_str(), body)->UseRealTime()->Unit(benchmark::kMicrosecond);
+}
+
+template <typename Result>
+benchmark::internal::Benchmark* AddQuery(const std::string& name, int rows, std::function<int(Result&)> fill, bool held,
+                                         Counters counters)
+{
+    counters["rows"] = rows;
+    Result probe;
+    const double before = HeapInUse();
+    if (held && fill(probe) == SQLITE_OK) {
+        counters["result_bytes"] = HeapInUse() - before;
+    }
+    const auto op = [=] {
+        Result result;
+        const int rc = fill(result);
+        if constexpr (std::is_same_v<Result, DACursor>) {
+            return rc != SQLITE_OK ? rc : result.GetCount() == rows ? 0 : -1;
+        } else {
+            return rc != SQLITE_OK ? rc : (result.empty() ? 0 : static_cast<int>(result[0].size())) == rows ? 0 : -1;
+        }
+    };
+    return Add(name, op, counters);
+}
+template benchmark::internal::Benchmark* AddQuery(const std::string&, int, std::function<int(DACursor&)>, bool,
+                                                  Counters);
+template benchmark::internal::Benchmark* AddQuery(const std::string&, int, std::function<int(Columns&)>, bool,
+                                                  Counters);
+
+std::function<int(Columns&)> Raw(const std::string& path, const std::string& sql)
+{
+    return [=](Columns& columns) { return OnFile(path, [&](sqlite3* db) { return RawSelectOn(db, sql, columns); }); };
+}
+
+std::function<int(Columns&)> SqliteCpp(const std::string& path, const std::string& sql)
+{
+    return [=](Columns& columns) {
+        try {
+            SQLite::Database db(path, SQLite::OPEN_READWRITE);
+            SQLite::Statement query(db, sql);
+            columns.assign(static_cast<std::size_t>(query.getColumnCount()), {});
+            while (query.executeStep()) {
+                for (std::size_t i = 0; i < columns.size(); ++i) {
+                    columns[i].emplace_back(query.getColumn(static_cast<int>(i)).getText());
+                }
+            }
+            return SQLITE_OK;
+        } catch (const std::exception& error) {
+            std::fprintf(stderr, "SQLiteCpp: %s\n", error.what());
+            return SQLITE_ERROR;
+        }
+    };
+}
+
+int OnFile(const std::string& path, const std::function<int(sqlite3*)>& run)
+{
+    sqlite3* db = nullptr;
+    const int rc = sqlite3_open(path.c_str(), &db);
+    const int result = rc == SQLITE_OK ? run(db) : rc;
+    sqlite3_close(db);
+    return result;
 }
 
 int RawExec(const std::string& path, const std::string& sql)
@@ -105,47 +138,6 @@ int RawSelectOn(sqlite3* db, const std::string& sql, Columns& columns)
     const int stepped = rc == SQLITE_OK ? RawStepCopy(stmt, columns) : rc;
     sqlite3_finalize(stmt);
     return stepped;
-}
-
-int RawSelect(const std::string& path, const std::string& sql, Columns& columns)
-{
-    return OnFile(path, [&](sqlite3* db) { return RawSelectOn(db, sql, columns); });
-}
-
-Op Rows(std::function<int(DACursor&)> select, int rows)
-{
-    return [=] {
-        DACursor cursor;
-        const int rc = select(cursor);
-        return rc != SQLITE_OK ? rc : cursor.GetCount() == rows ? 0 : -1;
-    };
-}
-
-Op RawRows(const std::string& path, const std::string& sql, int rows)
-{
-    return [=] {
-        Columns columns;
-        const int rc = RawSelect(path, sql, columns);
-        return rc != SQLITE_OK ? rc : !columns.empty() && columns[0].size() == static_cast<std::size_t>(rows) ? 0 : -1;
-    };
-}
-
-int SqliteCppSelect(const std::string& path, const std::string& sql, Columns& columns)
-{
-    try {
-        SQLite::Database db(path, SQLite::OPEN_READWRITE);
-        SQLite::Statement query(db, sql);
-        columns.assign(static_cast<std::size_t>(query.getColumnCount()), {});
-        while (query.executeStep()) {
-            for (std::size_t i = 0; i < columns.size(); ++i) {
-                columns[i].emplace_back(query.getColumn(static_cast<int>(i)).getText());
-            }
-        }
-    } catch (const std::exception& error) {
-        std::fprintf(stderr, "SQLiteCpp: %s\n", error.what());
-        return 1;
-    }
-    return 0;
 }
 
 double HeapInUse()
@@ -178,34 +170,33 @@ int main(int argc, char** argv)
     void* block = std::malloc(16U << 20U);
     benchmark::DoNotOptimize(block);
     std::free(block);
-    const auto list = [](const char* variable, const char* fallback) {
-        std::istringstream words(std::getenv(variable) != nullptr ? std::getenv(variable) : fallback);
-        return std::vector<std::string>(std::istream_iterator<std::string>(words), {});
+    const auto env = [](const char* variable, const char* fallback) {
+        return std::istringstream(std::getenv(variable) != nullptr ? std::getenv(variable) : fallback);
     };
-    bench::SelectSizes().insert(100000);  // the page and walk cases read it
-    for (const std::string& size : list("ULO_BENCH_SIZES", "1000 10000 100000 1000000")) {
-        bench::SelectSizes().insert(std::stoi(size));
-    }
-    const std::vector<std::string> names = list("ULO_BENCH_LOCATIONS", "tmpfs disk");
+    auto sizes = env("ULO_BENCH_SIZES", "1000 10000 100000 1000000"), names = env("ULO_BENCH_LOCATIONS", "tmpfs disk");
+    bench::selectSizes = {std::istream_iterator<int>(sizes), {}};
+    bench::selectSizes.insert(100000);  // the page and walk cases read it
     std::vector<bench::Location> locations;
-    for (const std::string& name : names) {
-        std::string dir = (name == "tmpfs" ? "/dev/shm" : list("TMPDIR", "/tmp").at(0)) + "/ulo_db_bench.XXXXXX";
-        if (mkdtemp(dir.data()) == nullptr || !bench::CreateQueryDatabase(dir + "/" + bench::kQueryFile)) {
+    bool ready = true;
+    for (std::istream_iterator<std::string> name(names), end; ready && name != end; ++name) {
+        std::string dir = (*name == "tmpfs" ? "/dev/shm" : env("TMPDIR", "/tmp").str()) + "/ulo_db_bench.XXXXXX";
+        // A folder made is removed at the end, whatever follows.
+        ready = mkdtemp(dir.data()) != nullptr && (locations.push_back({*name, dir}), true) &&
+            bench::CreateQueryDatabase(dir + "/" + bench::kQueryFile);
+        if (!ready) {
             std::perror(dir.c_str());
-            break;
         }
-        locations.push_back({name, dir});
     }
-    const bool ready = locations.size() == names.size();
-    if (ready) {
-        benchmark::AddCustomContext("sqlite_version", sqlite3_libversion());
-        benchmark::AddCustomContext("compiler", __VERSION__);
-        for (const bench::CaseFn fn : bench::Registry()) {
-            for (const bench::Location& location : locations) {
-                fn(location);
-            }
-            fn({"memory", ""});
+    benchmark::AddCustomContext("sqlite_version", sqlite3_libversion());
+    benchmark::AddCustomContext("compiler", __VERSION__);
+    for (const bench::Location& location : ready ? locations : std::vector<bench::Location>{}) {
+        for (const auto cases :
+             {bench::ConditionCases, bench::QueryCases, bench::SchemaCases, bench::SessionCases, bench::WriteCases}) {
+            cases(location);
         }
+    }
+    if (ready) {
+        bench::NameCases();
         benchmark::RunSpecifiedBenchmarks();
     }
     benchmark::Shutdown();

@@ -1,7 +1,7 @@
 #ifndef ULO_DB_BENCH_H
 #define ULO_DB_BENCH_H
 
-// The harness every case uses; README.md here says how to add a case, a target or a report section.
+// The harness every case uses; docs/benchmarks.md says how a case, a target or a report section is added.
 
 #include <functional>
 #include <map>
@@ -18,7 +18,7 @@ struct sqlite3_stmt;
 
 namespace bench {
 
-// A data folder: "tmpfs" (under /dev/shm), "disk" (under $TMPDIR) or "memory" (dir empty).
+// A fresh data folder: "tmpfs" (under /dev/shm) or "disk" (under $TMPDIR).
 struct Location {
     std::string name;
     std::string dir;
@@ -28,29 +28,43 @@ struct Location {
 // One timed call: 0 on success; anything else ends the case with "<name> failed: <code>".
 using Op = std::function<int()>;
 using Counters = std::map<std::string, double>;
-// Registers op as the case name in wall-clock time (a commit waits without using the CPU); untimed, if
-// given, runs before every call with the clock stopped. Returns the benchmark for Iterations and the like.
+// Registers op as case name, timed in wall-clock time (a commit waits without using the CPU); untimed, if
+// given, runs before every call with the clock stopped.
 benchmark::internal::Benchmark* Add(const std::string& name, Op op, Counters counters = {}, Op untimed = nullptr);
-// ULO_BENCH_CASES(fn) has main call fn for each file location and once for "memory".
-using CaseFn = void (*)(const Location&);
-int Cases(CaseFn fn);
-#define ULO_BENCH_CASES(fn) [[maybe_unused]] static const int fn##_registered = bench::Cases(fn)
+// Each section's cases (a source file each), registered by main for each location; names touch no file.
+void ConditionCases(const Location& at);
+void NameCases();
+void QueryCases(const Location& at);
+void SchemaCases(const Location& at);
+void SessionCases(const Location& at);
+void WriteCases(const Location& at);
 
-// The query database every location holds: sel_<N> (id, qty, price, label) for every N of SelectSizes(),
-// the join tables jl (kJoinRows rows, gid) and jr (kJoinGroups rows, gkey).
+// A query case: fill(result) into a fresh cursor, or copying every value as text into one vector per column,
+// must return 0 with rows rows. counters gets rows; held adds result_bytes, the heap one result holds.
+using Columns = std::vector<std::vector<std::string>>;
+template <typename Result>
+benchmark::internal::Benchmark* AddQuery(const std::string& name, int rows, std::function<int(Result&)> fill,
+                                         bool held = false, Counters counters = {});
+// Fills with sql on path through raw SQLite or SQLiteCpp.
+std::function<int(Columns&)> Raw(const std::string& path, const std::string& sql);
+std::function<int(Columns&)> SqliteCpp(const std::string& path, const std::string& sql);
+
+// Raw SQLite: run on path opened (closed again after); sql run on path; sql stepped on db, its values copied;
+// a prepared stmt stepped to its end, its values copied, then reset (returns the reset's code).
+int OnFile(const std::string& path, const std::function<int(sqlite3*)>& run);
+int RawExec(const std::string& path, const std::string& sql);
+int RawSelectOn(sqlite3* db, const std::string& sql, Columns& columns);
+int RawStepCopy(sqlite3_stmt* stmt, Columns& columns);
+
+// Every file location holds kQueryFile: sel_<N> (kRowColumns) for N in selectSizes, and the join tables
+// jl (kJoinRows rows, gid) and jr (1000 rows, gkey).
 constexpr const char* kQueryFile = "query.db";
-std::set<int>& SelectSizes();
-inline std::string SelectTable(int rows)
-{
-    return "sel_" + std::to_string(rows);
-}
+constexpr const char* kRowColumns = "id INTEGER PRIMARY KEY, qty INTEGER, price REAL, label TEXT";
 constexpr int kJoinRows = 100000;
-constexpr int kJoinGroups = 1000;
-
+inline std::set<int> selectSizes;  // from ULO_BENCH_SIZES
 // "CREATE TABLE table (columns); INSERT INTO table ...": values (a select list over i) for i = 0..rows-1.
 std::string TableSql(const std::string& table, const std::string& columns, int rows, const std::string& values);
-// table dropped and made again with kRowColumns, rows rows: id, id * 3, id * 0.5, 'row-<id>' for id 1..rows.
-constexpr const char* kRowColumns = "id INTEGER PRIMARY KEY, qty INTEGER, price REAL, label TEXT";
+// table dropped and made again: rows rows of kRowColumns, id, id * 3, id * 0.5, 'row-<id>' for id 1..rows.
 std::string FreshTable(const std::string& table, int rows);
 
 // A request of type R on table of file in at's folder.
@@ -63,20 +77,7 @@ std::shared_ptr<R> Request(const Location& at, const char* file, const std::stri
     return request;
 }
 
-// Raw baselines (open path, run, close); the selects copy every value as text, one vector per column.
-using Columns = std::vector<std::vector<std::string>>;
-int RawExec(const std::string& path, const std::string& sql);
-int RawSelect(const std::string& path, const std::string& sql, Columns& columns);
-int RawSelectOn(sqlite3* db, const std::string& sql, Columns& columns);
-// Steps a prepared stmt to its end, copying every value, then resets it; returns the reset's code.
-int RawStepCopy(sqlite3_stmt* stmt, Columns& columns);
-int SqliteCppSelect(const std::string& path, const std::string& sql, Columns& columns);
-// Ops checking a select: 0, its error code, or -1 when it does not hold rows rows (select into a fresh
-// cursor; sql on path through RawSelect).
-Op Rows(std::function<int(DACursor&)> select, int rows);
-Op RawRows(const std::string& path, const std::string& sql, int rows);
-// Heap bytes in use (mallinfo2).
-double HeapInUse();
+double HeapInUse();  // heap bytes in use (mallinfo2)
 
 }  // namespace bench
 

@@ -28,14 +28,13 @@ int TenMillionNames()
     return 0;
 }
 
-void NameCases(const bench::Location& at)
+}  // namespace
+
+void bench::NameCases()
 {
     static std::mutex reference;
     static const std::string column = std::string("column_") + "timestamp_ms";
     static const char* const interned = DAColumnName::Intern(column.c_str());
-    if (at.name != "memory") {
-        return;
-    }
     // lock/{uncontended,4threads}: one name like the library's (a heap address in hexadecimal).
     for (const int threads : {1, 4}) {
         const std::string prefix = threads == 1 ? "lock/uncontended/memory/" : "lock/4threads/memory/";
@@ -56,7 +55,3 @@ void NameCases(const bench::Location& at)
     bench::Add("intern/1thread/memory/lib", intern)->Unit(benchmark::kNanosecond);
     bench::Add("intern/2threads/memory/lib", intern)->Threads(2)->Unit(benchmark::kNanosecond);
 }
-
-}  // namespace
-
-ULO_BENCH_CASES(NameCases);

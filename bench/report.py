@@ -1,6 +1,6 @@
 #!/usr/bin/env python3
-"""Rewrites the results in docs/benchmarks.md from Google Benchmark's JSON output.
-Targets are judged on each repetition: "yes" when all meet one, "no" when none does, "open" otherwise."""
+"""Rewrites the results in docs/benchmarks.md from Google Benchmark's JSON output; targets are judged on each
+repetition: "yes" when all meet one, "no" when none does, "open" otherwise."""
 
 import argparse
 import json
@@ -14,36 +14,10 @@ from collections import defaultdict
 BEGIN, END = "<!-- results:begin -->", "<!-- results:end -->"
 LOCATIONS = ("tmpfs", "disk", "memory")
 
-# (title, section prefixes, what is measured): one table each.
-SECTIONS = [
-    ("Write operations", ["write"], "Per call: open, one statement, close. Raw: the same path and statement text "
-     "through `sqlite3_open` / `sqlite3_exec` / `sqlite3_close`."),
-    ("Batches", ["batch"], "10,000 upserts filled as requests and run by one `ExecuteBatch`; raw builds the same "
-     "texts and runs them in one `BEGIN IMMEDIATE`/`COMMIT`; single: one `Upsert` call each (on disk 500 of them, "
-     "counter `statements`). `held_bytes`: the heap a filled batch holds, `text_bytes`: its statements' bytes."),
-    ("Queries", ["select", "join", "page", "exist"], "The result in a `DACursor` against raw `sqlite3_prepare_v2` + "
-     "`sqlite3_step` and SQLiteCpp copying every value of the same statement as text into one vector per column; "
-     "each call opens, reads, closes and frees its result. `page`: rows 1,001–1,100 of 100,000 by the indexed key, "
-     "`selectall` the whole table. `result_bytes`: the heap one result holds while alive."),
-    ("Reading a cursor", ["walk"], "`MoveToNext` over 100,000 rows with `GetInt`, `GetInt`, `GetDouble`, "
-     "`GetString` per row, against the same reads (`std::istringstream`) from the raw column vectors."),
-    ("Names", ["lock", "intern", "memory"], "A `DAMutex` named like the library's made, locked, unlocked and "
-     "destroyed, against a global `std::mutex`; `DAColumnName::Intern` of a known name (time per call of each "
-     "thread); 10,000,000 distinct lock names coming and going (`growth_bytes`: the heap they leave behind)."),
-    ("Conditions", ["cond"], "100,000 events, `ts` indexed: a retention delete of the oldest 20 % by a range "
-     "(`equality`: read all, filter, a batch of deletes by key), a count per type, a keyset page of 50 (`offset`: "
-     "the same page at offset 50,000; `session`, `sessionoffset`: both pages through a `DASession` holding the "
-     "file); raw runs the same statement text."),
-    ("Schema", ["schema"], "A column added to a 100,000-row table: `AddColumn` against the same `ALTER TABLE` raw "
-     "and `rewrite` (every row copied into a new table with the column, in one transaction); `Migrate` of a file "
-     "already at the step's version against `Select` of an empty table; `Compact` after deleting the older half of "
-     "100,000 rows (`before_bytes`, `after_bytes`: the file)."),
-    ("Sessions", ["session"], "A `DASession` held open (lib) against the same request per call (percall, a "
-     "rollback-journal file) and a raw connection held open in WAL mode running the same text (raw) or reusing "
-     "one prepared statement (rawkept); `Readers1`/"
-     "`Readers2`: pages of 50 rows read beside a writer going flat out (rows: the reads of one second). `held_bytes`: the "
-     "heap an open session holds beyond SQLite's page cache."),
-]
+# (title, section prefixes): one table each; docs/benchmarks.md says what each measures.
+SECTIONS = [("Write operations", ["write"]), ("Batches", ["batch"]), ("Queries", ["select", "join", "page", "exist"]),
+            ("Reading a cursor", ["walk"]), ("Names", ["lock", "intern", "memory"]), ("Conditions", ["cond"]),
+            ("Schema", ["schema"]), ("Sessions", ["session"])]
 
 
 def ratio(a, b, metric="real", per=None):
@@ -93,8 +67,7 @@ TARGETS = [
     *both("count per type, {l}: lib / raw", "cond/count/{l}/lib", "raw", "<=", 1.3),
     *both("keyset page, {l}: lib / raw", "cond/keyset/{l}/lib", "raw", "<=", 1.8),
     *both("keyset page, {l}: offset / keyset", "cond/keyset/{l}/offset", "lib", ">=", 20),
-    *both("keyset page through a session, {l}: offset / keyset", "cond/keyset/{l}/sessionoffset", "session", ">=",
-          20),
+    *both("keyset page, session, {l}: offset / keyset", "cond/keyset/{l}/sessionoffset", "session", ">=", 20),
     *both("`AddColumn`, 100k rows, {l}: lib / raw", "schema/AddColumn100000/{l}/lib", "raw", "<=", 1.2),
     *both("`AddColumn`, 100k rows, {l}: rewrite / lib", "schema/AddColumn100000/{l}/rewrite", "lib", ">=", 100),
     *both("`Migrate` up to date, {l}: lib / empty `Select`", "schema/MigrateUpToDate/{l}/lib", "select", "<=", 2),
@@ -119,9 +92,8 @@ def load(path):
     data, samples = json.load(open(path)), defaultdict(list)
     for run in data["benchmarks"]:
         if run.get("run_type") == "iteration" and not run.get("error_occurred"):
-            unit = {"ns": 1e-3, "us": 1.0, "ms": 1e3, "s": 1e6}[run["time_unit"]]
             sample = {k: v for k, v in run.items() if k in ("rows", "statements") or k.endswith("_bytes")}
-            sample["real"] = run["real_time"] * unit
+            sample["real"] = run["real_time"] * {"ns": 1e-3, "us": 1.0, "ms": 1e3, "s": 1e6}[run["time_unit"]]
             samples["/".join(run["run_name"].split("/")[:4])].append(sample)
     return data.get("context", {}), samples
 
@@ -138,25 +110,23 @@ def cell(runs):
     return text + (f" ({us * 1000 / runs[0]['rows']:.0f} ns/row)" if runs[0].get("rows", 1) > 1 else "")
 
 
-def table(title, prefixes, text, samples):
+def table(title, prefixes, samples):
     """A row per case and location, a column per impl, lib / the first baseline, the counters."""
-    rows, impls = defaultdict(dict), set()
+    rows, order = defaultdict(dict), ["lib", "raw", "sqlitecpp"]
     for name, runs in samples.items():
         section, case, location, impl = name.split("/")
         if section in prefixes:
-            number = int(re.sub(r"\D", "", case) or 0)
-            rows[(prefixes.index(section), number, case, LOCATIONS.index(location))][impl] = runs
-            impls.add(impl)
-    order = ["lib", "raw", "sqlitecpp"]
-    impls = sorted(impls, key=lambda i: (order.index(i) if i in order else len(order), i))
+            key = (prefixes.index(section), int(re.sub(r"\D", "", case) or 0), case, LOCATIONS.index(location))
+            rows[key][impl] = runs
+    impls = sorted({i for by in rows.values() for i in by}, key=lambda i: (order.index(i) if i in order else 3, i))
     base = next((i for i in impls if i != "lib"), "—")
-    lines = [f"### {title}", "", text, "", f"| case | location | {' | '.join(impls)} | lib / {base} | counters |",
+    lines = [f"### {title}", "", f"| case | location | {' | '.join(impls)} | lib / {base} | counters |",
              "|---" * (len(impls) + 4) + "|"]
     for (section, _, case, location), by in sorted(rows.items()):
         share = f"{median(by['lib']) / median(by[base]):.3f}" if "lib" in by and base in by else "—"
-        counted = {impl: {k: v for k, v in runs[0].items() if k not in ("real", "rows")} for impl, runs in by.items()}
-        counters = "; ".join(f"{impl}: " + ", ".join(f"{k} {v:,.0f}" for k, v in sorted(counted[impl].items()))
-                             for impl in impls if counted.get(impl))
+        counted = {i: ", ".join(f"{k} {v:,.0f}" for k, v in sorted(runs[0].items()) if k not in ("real", "rows"))
+                   for i, runs in by.items()}
+        counters = "; ".join(f"{i}: {counted[i]}" for i in impls if counted.get(i))
         cells = " | ".join(cell(by[i]) if i in by else "—" for i in impls)
         lines.append(f"| `{prefixes[section]}/{case}` | {LOCATIONS[location]} | {cells} | {share} | {counters or '—'} |")
     return lines + [""] if rows else []
@@ -185,28 +155,28 @@ def summary(samples):
 
 
 def main():
-    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser = argparse.ArgumentParser(description=__doc__)
     parser.add_argument("--bench", required=True, help="Google Benchmark's JSON output")
     parser.add_argument("--doc", required=True, help="the report to rewrite")
     args = parser.parse_args()
     context, samples = load(args.bench)
     cpu = next((line.split(":", 1)[1].strip() for line in open("/proc/cpuinfo") if line.startswith("model name")), "?")
-    version = lambda package: subprocess.run(["dpkg-query", "-W", "-f=${Version}", package], capture_output=True,
-                                             text=True, check=False).stdout or "?"
+    versions = [context.get("sqlite_version", "?")] + [subprocess.run(
+        ["dpkg-query", "-W", "-f=${Version}", p], capture_output=True, text=True).stdout or "?"
+        for p in ("libbenchmark-dev", "libsqlitecpp-dev")]
+    machine = [("CPU", f"{cpu}, {os.cpu_count()} cores"), ("Kernel", platform.release()),
+               ("Compiler", f"GCC {context.get('compiler', '?')}, Release (-O3)"),
+               ("SQLite, Google Benchmark, SQLiteCpp", ", ".join(versions)),
+               ("Data", "tmpfs: a fresh folder on tmpfs; disk: one under the build folder; both removed after the run"),
+               ("Run", context.get("date", "?"))]
     lines = ["## Results", "", "Generated by `scripts/bench.sh`; do not edit by hand. Times are medians of the "
-             "repetitions, ± half their range.", "", "### Machine", "", "| | |", "|---|---|",
-             f"| CPU | {cpu}, {os.cpu_count()} cores |", f"| Kernel | {platform.release()} |",
-             f"| Compiler | GCC {context.get('compiler', '?')}, Release (-O3) |",
-             f"| SQLite, Google Benchmark, SQLiteCpp | {context.get('sqlite_version', '?')}, "
-             f"{version('libbenchmark-dev')}, {version('libsqlitecpp-dev')} |",
-             "| Data | tmpfs: a fresh folder on tmpfs; disk: one under the build folder; both removed after the run |",
-             f"| Run | {context.get('date', '?')} |", ""] + summary(samples)
-    for title, prefixes, text in SECTIONS:
-        lines += table(title, prefixes, text, samples)
-    text = open(args.doc).read()
-    with open(args.doc, "w") as handle:
-        handle.write(re.sub(re.escape(BEGIN) + ".*?" + re.escape(END),
-                            lambda _: BEGIN + "\n" + "\n".join(lines) + "\n" + END, text, flags=re.S))
+             "repetitions, ± half their range.", "", "### Machine", "", "| | |", "|---|---|"]
+    lines += [f"| {k} | {v} |" for k, v in machine] + [""] + summary(samples)
+    for title, prefixes in SECTIONS:
+        lines += table(title, prefixes, samples)
+    text = re.sub(re.escape(BEGIN) + ".*?" + re.escape(END), lambda _: "\n".join([BEGIN, *lines, END]),
+                  open(args.doc).read(), flags=re.S)
+    open(args.doc, "w").write(text)
 
 
 if __name__ == "__main__":

@@ -1,5 +1,4 @@
-// Schema: a column added to 100,000 rows (rewrite: every row copied into a new table, the way before), Migrate
-// of an up-to-date file against an empty Select, Compact after deleting the older half of 100,000 rows.
+// Schema: AddColumn (against rewriting the table), Migrate of an up-to-date file, Compact.
 
 #include <filesystem>
 
@@ -7,13 +6,8 @@
 #include "DASqlGenerator.h"
 #include "bench.h"
 
-namespace {
-
-void SchemaCases(const bench::Location& at)
+void bench::SchemaCases(const Location& at)
 {
-    if (at.dir.empty()) {
-        return;
-    }
     const std::string prefix = "/" + at.name + "/";
     for (const std::string impl : {"lib", "raw"}) {  // columns c0..c99 in turn, the table made again before c0
         const std::string file = impl + ".db", path = at.Path(file.c_str());
@@ -36,12 +30,10 @@ void SchemaCases(const bench::Location& at)
     }
     const std::string path = at.Path("rewrite.db");
     bench::RawExec(path, bench::FreshTable("w", 100000));
-    bench::Add("schema/AddColumn100000" + prefix + "rewrite", [=] {
-        return bench::RawExec(path,
-                              "BEGIN IMMEDIATE; CREATE TABLE w2 (id INTEGER PRIMARY KEY, qty INTEGER, price "
-                              "REAL, label TEXT, level INTEGER DEFAULT '0'); INSERT INTO w2 SELECT id, qty, "
-                              "price, label, 0 FROM w; DROP TABLE w; ALTER TABLE w2 RENAME TO w; COMMIT;");
-    })->Iterations(5);
+    const std::string rewrite = "BEGIN IMMEDIATE; CREATE TABLE w2 (" + std::string(bench::kRowColumns) +
+        ", level INTEGER); INSERT INTO w2 SELECT id, qty, price, label, 0 FROM w; DROP TABLE w;";
+    const bench::Op copy = [=] { return bench::RawExec(path, rewrite + "ALTER TABLE w2 RENAME TO w; COMMIT"); };
+    bench::Add("schema/AddColumn100000" + prefix + "rewrite", copy)->Iterations(5);
     bench::RawExec(at.Path("version.db"), "CREATE TABLE e (k INTEGER); PRAGMA user_version = 1;");
     auto step = std::make_shared<DABatchRequest>();
     step->SetPath(at.dir.c_str(), "version.db");
@@ -51,13 +43,10 @@ void SchemaCases(const bench::Location& at)
     create.SetColumnKey("k", "INTEGER");
     step->Add(create);
     bench::Add("schema/MigrateUpToDate" + prefix + "lib", [=] { return DADatabase().Migrate(*step, 1); });
-    bench::Add("schema/MigrateUpToDate" + prefix + "select", [=] {
-        DACursor cursor;
-        return DADatabase().Select(*select, cursor);
-    });
+    const auto empty = [=](DACursor& cursor) { return DADatabase().Select(*select, cursor); };
+    bench::AddQuery<DACursor>("schema/MigrateUpToDate" + prefix + "select", -1, empty);
     const std::string file = at.Path("compact.db");
-    auto location = std::make_shared<DABasePath>();
-    location->SetPath(at.dir.c_str(), "compact.db");
+    auto location = bench::Request<DASelectRequest>(at, "compact.db", "t");  // its location
     const auto refill = [=] {
         return bench::RawExec(file, bench::FreshTable("t", 100000) + "DELETE FROM t WHERE id <= 50000;");
     };
@@ -68,7 +57,3 @@ void SchemaCases(const bench::Location& at)
         {{"before_bytes", before}, {"after_bytes", after}}, refill)
         ->Iterations(3);
 }
-
-}  // namespace
-
-ULO_BENCH_CASES(SchemaCases);

@@ -1,8 +1,6 @@
-// Sessions: a file held open (lib) against a per-call visit (percall) and a raw WAL connection held open running
-// the same text (raw), or reusing one prepared statement (rawkept).
+// Sessions: a file held open against per-call visits and raw WAL connections held open.
 
 #include <atomic>
-#include <chrono>
 #include <cstring>
 #include <thread>
 
@@ -17,7 +15,6 @@
 namespace {
 
 using bench::Location;
-
 // file with t (rows 1..1000) and tables - 1 more, indexed; a raw connection to it held open as given.
 std::shared_ptr<sqlite3> Make(const Location& at, const std::string& file, int tables = 1,
                               const char* synchronous = "FULL", const char* journal = "WAL")
@@ -41,17 +38,21 @@ std::shared_ptr<DASession> Open(const Location& at, const std::string& file, boo
     Make(at, file, tables);
     auto session = std::make_shared<DASession>();
     session->SetSyncOnCommit(sync);
-    DABasePath location;
-    location.SetPath(at.dir.c_str(), file.c_str());
-    return session->Open(location) == SQLITE_OK ? session : nullptr;
+    return session->Open(*bench::Request<DASelectRequest>(at, file.c_str(), "t")) == SQLITE_OK ? session : nullptr;
 }
 
-// sql prepared once on db, for the raw baseline that reuses one statement (rawkept).
-std::shared_ptr<sqlite3_stmt> Kept(const std::shared_ptr<sqlite3>& db, const char* sql)
+// A raw baseline on a held connection: text prepared each call (raw), or once and bound with id (rawkept).
+std::function<int(bench::Columns&)> Raw(const std::shared_ptr<sqlite3>& db, const std::string& text, int id = 0)
 {
     sqlite3_stmt* stmt = nullptr;
-    sqlite3_prepare_v2(db.get(), sql, -1, &stmt, nullptr);
-    return {stmt, [db](sqlite3_stmt* s) { sqlite3_finalize(s); }};
+    if (id != 0) {
+        sqlite3_prepare_v2(db.get(), text.c_str(), -1, &stmt, nullptr);
+    }
+    const std::shared_ptr<sqlite3_stmt> kept(stmt, [db](sqlite3_stmt* s) { sqlite3_finalize(s); });
+    return [=](bench::Columns& c) {
+        return kept ? (sqlite3_bind_int(kept.get(), 1, id), bench::RawStepCopy(kept.get(), c))
+                    : bench::RawSelectOn(db.get(), text, c);
+    };
 }
 
 // The select or the upsert of the row id of t in the session's file.
@@ -80,21 +81,15 @@ void Writes(const Location& at)
     for (const bool sync : {true, false}) {
         const std::string prefix = std::string("session/Upsert") + (sync ? "/" : "Unsynced/") + at.name + "/";
         auto session = Open(at, sync ? "synced.db" : "unsynced.db", sync);
-        bench::Add(prefix + "lib", [=] { return session ? session->Upsert(*upsert) : 1; });
         auto raw = Make(at, sync ? "raw_full.db" : "raw_normal.db", 1, sync ? "FULL" : "NORMAL");
-        bench::Add(prefix + "raw", [=] { return sqlite3_exec(raw.get(), text.c_str(), nullptr, nullptr, nullptr); });
-        auto kept = Kept(raw, "INSERT OR REPLACE INTO t (id, label) VALUES (?, 'upserted')");
-        bench::Add(prefix + "rawkept", [=] {
-            sqlite3_bind_int(kept.get(), 1, 7);
-            const int rc = sqlite3_step(kept.get());
-            sqlite3_reset(kept.get());
-            return rc == SQLITE_DONE ? 0 : rc;
-        });
+        bench::Add(prefix + "lib", [=] { return session ? session->Upsert(*upsert) : 1; });
+        bench::AddQuery(prefix + "raw", 0, Raw(raw, text));
+        bench::AddQuery(prefix + "rawkept", 0,
+                        Raw(raw, "INSERT OR REPLACE INTO t (id, label) VALUES (?, 'upserted')", 7));
     }
 }
 
-// Select by key (held_bytes: the heap an open session holds beyond SQLite's page cache after a read and a
-// write), and an empty select in a file of 1 and of 500 tables.
+// held_bytes: the heap an open session holds beyond SQLite's page cache, after a read and a write.
 void Reads(const Location& at)
 {
     const auto heap = [] {
@@ -111,95 +106,72 @@ void Reads(const Location& at)
     const int warm = session ? session->Select(*select, cursor) + session->Upsert(*Row<DAUpsertRequest>(0)) : 1;
     const double held = heap() - closed;
     const std::string prefix = "session/Select/" + at.name + "/";
-    const auto lib = [=](DACursor& c) { return warm != 0 ? warm : session->Select(*select, c); };
-    bench::Add(prefix + "lib", bench::Rows(lib, 1), {{"held_bytes", held}});
-    bench::Add(prefix + "percall", bench::Rows([=](DACursor& c) { return DADatabase().Select(*located, c); }, 1));
+    bench::AddQuery<DACursor>(prefix + "lib", 1,
+                              [=](DACursor& c) { return warm != 0 ? warm : session->Select(*select, c); }, false,
+                              {{"held_bytes", held}});
+    bench::AddQuery<DACursor>(prefix + "percall", 1, [=](DACursor& c) { return DADatabase().Select(*located, c); });
     std::string text;
     DASqlGenerator().GetSelectSql(*select, text);
-    bench::Add(prefix + "raw", [=] {
-        bench::Columns columns;
-        const int rc = bench::RawSelectOn(raw.get(), text, columns);
-        return rc != SQLITE_OK ? rc : columns[0].size() == 1 ? 0 : 1;
-    });
-    auto kept = Kept(raw, "SELECT * FROM t WHERE id=?");
-    bench::Add(prefix + "rawkept", [=] {
-        bench::Columns columns;
-        sqlite3_bind_int(kept.get(), 1, 500);
-        const int rc = bench::RawStepCopy(kept.get(), columns);
-        return rc != SQLITE_OK ? rc : columns[0].size() == 1 ? 0 : 1;
-    });
+    bench::AddQuery(prefix + "raw", 1, Raw(raw, text));
+    bench::AddQuery(prefix + "rawkept", 1, Raw(raw, "SELECT * FROM t WHERE id=?", 500));
     for (const int tables : {1, 500}) {
-        const std::string file = "tables" + std::to_string(tables) + ".db";
-        auto held = Open(at, file, true, tables);
+        auto held = Open(at, "tables" + std::to_string(tables) + ".db", true, tables);
         auto none = Row<DASelectRequest>(-1);
-        bench::Add("session/EmptySelect" + std::to_string(tables) + "/" + at.name + "/lib", [=] {
-            DACursor cursor;
-            return held ? held->Select(*none, cursor) : 1;
-        });
+        const auto select = [=](DACursor& c) { return held ? held->Select(*none, c) : 1; };
+        bench::AddQuery<DACursor>("session/EmptySelect" + std::to_string(tables) + "/" + at.name + "/lib", -1, select);
     }
 }
 
-// session/Readers{1,2}: pages of 50 rows read for a second beside a writer upserting without pause (rows:
-// the reads); fails if a read met SQLITE_BUSY. (Reads of one row do not scale even on raw connections: each
-// read transaction takes SQLite's process-wide file lock, which then costs more than the read.)
+// Each reader reads kReads pages of 50 rows (one row per read does not scale even raw: each read transaction
+// takes SQLite's process-wide file lock); fails if a read met SQLITE_BUSY.
+constexpr int kReads = 25000;
 thread_local bool t_reader = false;
 
-void Readers(const Location& at, int readers)
+int ReadBesideWriter(DASession& session, int readers)
 {
-    auto session = Open(at, "readers.db");
-    auto body = [=](benchmark::State& state) {
-        for (auto _ : state) {
-            std::atomic<bool> stop{false};
-            std::atomic<int> reads{0}, busy{0};
-            dlog_set_sink(
-                [](int, int, const char*, const char* text, void* count) {
-                    *static_cast<std::atomic<int>*>(count) += t_reader && std::strstr(text, "SQLITE BUSY") ? 1 : 0;
-                },
-                &busy);
-            std::vector<std::thread> threads;
-            threads.emplace_back([&] {
-                for (int i = 0; !stop; ++i) {
-                    session->Upsert(*Row<DAUpsertRequest>(2000 + i % 1000));
-                }
-            });
-            const auto start = std::chrono::steady_clock::now();
-            for (int t = 0; t < readers; ++t) {
-                threads.emplace_back([&] {
-                    t_reader = true;
-                    DASelectRequest page;  // a reader paging the file: 50 rows
-                    page.SetTable("t");
-                    page.SetWhere("id", DACompare::LessEqual, 50);
-                    for (DACursor cursor; !stop && session->Select(page, cursor) == 0; ++reads) {}
-                });
-            }
-            std::this_thread::sleep_for(std::chrono::seconds(1));
-            stop = true;
-            state.SetIterationTime(std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count());
-            for (std::thread& thread : threads) {
-                thread.join();
-            }
-            dlog_set_sink(dlog_discard_sink, nullptr);
-            state.counters["rows"] = reads.load();
-            if (busy != 0) {
-                state.SkipWithError("a read met SQLITE_BUSY");
-            }
+    std::atomic<int> failed{0};
+    dlog_set_sink(
+        [](int, int, const char*, const char* text, void* failures) {
+            *static_cast<std::atomic<int>*>(failures) += t_reader && std::strstr(text, "SQLITE BUSY") ? 1 : 0;
+        },
+        &failed);
+    std::atomic<bool> stop{false};
+    std::thread writer([&] {
+        for (int i = 0; !stop; ++i) {
+            session.Upsert(*Row<DAUpsertRequest>(2000 + i % 1000));
         }
-    };
-    benchmark::RegisterBenchmark(("session/Readers" + std::to_string(readers) + "/" + at.name + "/lib").c_str(), body)
-        ->UseManualTime()
-        ->Iterations(1)
-        ->Unit(benchmark::kMicrosecond);
-}
-
-void SessionCases(const Location& at)
-{
-    if (!at.dir.empty()) {
-        at.name == "disk" ? Writes(at) : Reads(at);
-        Readers(at, 1);
-        Readers(at, 2);
+    });
+    std::vector<std::thread> threads(static_cast<std::size_t>(readers));
+    for (std::thread& reader : threads) {
+        reader = std::thread([&] {
+            t_reader = true;
+            DASelectRequest page;
+            page.SetTable("t");
+            page.SetWhere("id", DACompare::LessEqual, 50);
+            DACursor cursor;  // one per reader, as an app paging would keep it
+            for (int i = 0; i < kReads; ++i) {
+                failed += session.Select(page, cursor) != SQLITE_OK || cursor.GetCount() != 50 ? 1 : 0;
+            }
+        });
     }
+    for (std::thread& reader : threads) {
+        reader.join();
+    }
+    stop = true;
+    writer.join();
+    dlog_set_sink(dlog_discard_sink, nullptr);
+    return failed;
 }
 
 }  // namespace
 
-ULO_BENCH_CASES(SessionCases);
+void bench::SessionCases(const Location& at)
+{
+    at.name == "disk" ? Writes(at) : Reads(at);
+    for (const int readers : {1, 2}) {
+        auto session = Open(at, "readers" + std::to_string(readers) + ".db");
+        bench::Add("session/Readers" + std::to_string(readers) + "/" + at.name + "/lib",
+                   [=] { return session ? ReadBesideWriter(*session, readers) : 1; }, {{"rows", kReads * readers}})
+            ->Iterations(1);
+    }
+}

@@ -11,20 +11,10 @@
 namespace {
 
 using bench::Location;
-
 constexpr int kDeletePool = 1000;  // rows of d, refilled (untimed) when all are deleted
 
-DAUpsertRequest& Set(DAUpsertRequest& request, int id, int qty, double price, const char* label)
-{
-    request.SetData("id", id);
-    request.SetData("qty", qty);
-    request.SetData("price", price);
-    request.SetData("label", label);
-    return request;
-}
-
-// write/<name>/<location>/{lib,raw}: the requests in turn (SQLite writes nothing for an update that changes
-// nothing or a delete matching nothing). 9 repetitions: calls near 100 us vary by several per cent.
+// write/<name>: the requests in turn, as SQLite writes nothing for an update that changes nothing or a delete
+// matching nothing. 9 repetitions: calls near 100 us vary by several per cent.
 template <typename R>
 void LibAndRaw(const Location& at, const std::string& name, std::vector<std::shared_ptr<R>> requests,
                int (DADatabase::*run)(R&), void (DASqlGenerator::*generate)(R&, std::string&),
@@ -42,12 +32,82 @@ void LibAndRaw(const Location& at, const std::string& name, std::vector<std::sha
     bench::Add(prefix + "raw", raw, {}, untimed)->Repetitions(9);
 }
 
-void Writes(const Location& at)
+// batch/Upsert10000: raw builds the same texts in the loop too and runs them one by one, as the batch does.
+constexpr int kStatements = 10000;
+
+// use of the upserts of rows 1..count of b in turn, up to the first that does not return 0.
+int EachUpsert(const Location& at, int count, const std::function<int(DAUpsertRequest&)>& use)
+{
+    int rc = 0;
+    for (int i = 1; i <= count && rc == 0; ++i) {
+        DAUpsertRequest request;
+        request.SetPath(at.dir.c_str(), "batch.db");
+        request.SetTable("b");
+        request.SetData("id", i);
+        request.SetData("qty", i * 3);
+        request.SetData("price", i * 0.5);
+        request.SetData("label", ("row-" + std::to_string(i)).c_str());
+        rc = use(request);
+    }
+    return rc;
+}
+
+void Batches(const Location& at)
+{
+    const std::string path = at.Path("batch.db"), prefix = "batch/Upsert10000/" + at.name + "/";
+    bench::RawExec(path, std::string("CREATE TABLE b (") + bench::kRowColumns + ")");
+    const auto fill = [at](DABatchRequest& batch) {
+        batch.SetPath(at.dir.c_str(), "batch.db");
+        return EachUpsert(at, kStatements, [&](DAUpsertRequest& request) { return batch.Add(request); });
+    };
+    double text = 0;
+    EachUpsert(at, kStatements, [&](DAUpsertRequest& request) {
+        std::string sql;
+        DASqlGenerator().GetUpsertSql(request, sql);
+        return text += static_cast<double>(sql.size()), 0;
+    });
+    const double before = bench::HeapInUse();
+    DABatchRequest probe;
+    const double held = (fill(probe), bench::HeapInUse() - before);
+    const auto lib = [fill] {
+        DABatchRequest batch;
+        const int rc = fill(batch);
+        return rc != 0 ? rc : DADatabase().ExecuteBatch(batch);
+    };
+    const auto raw = [path] {
+        return bench::OnFile(path, [](sqlite3* db) {
+            int rc = sqlite3_exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr);
+            for (int i = 1; rc == SQLITE_OK && i <= kStatements; ++i) {
+                char price[32];
+                std::snprintf(price, sizeof price, "%g", i * 0.5);
+                const std::string sql = "INSERT OR REPLACE INTO b (id, qty, price, label) VALUES ('" +
+                    std::to_string(i) + "', '" + std::to_string(i * 3) + "', '" + price + "', 'row-" +
+                    std::to_string(i) + "')";
+                rc = sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
+            }
+            return rc != SQLITE_OK ? rc : sqlite3_exec(db, "COMMIT", nullptr, nullptr, nullptr);
+        });
+    };
+    const int calls = at.name == "disk" ? 500 : kStatements;
+    const auto single = [at, calls] {
+        return EachUpsert(at, calls, [](DAUpsertRequest& request) { return DADatabase().Upsert(request); });
+    };
+    bench::Add(prefix + "lib", lib, {{"statements", kStatements}, {"held_bytes", held}, {"text_bytes", text}});
+    bench::Add(prefix + "raw", raw, {{"statements", kStatements}});
+    bench::Add(prefix + "single", single, {{"statements", calls}})->Iterations(1);
+}
+
+}  // namespace
+
+void bench::WriteCases(const Location& at)
 {
     const std::string path = at.Path("write.db");
     bench::RawExec(path, bench::FreshTable("w", 100));  // d: made by the first refill
     auto upsert = bench::Request<DAUpsertRequest>(at, "write.db", "w");
-    Set(*upsert, 7, 42, 2.5, "upserted");
+    upsert->SetData("id", 7);
+    upsert->SetData("qty", 42);
+    upsert->SetData("price", 2.5);
+    upsert->SetData("label", "upserted");
     LibAndRaw(at, "Upsert", {upsert}, &DADatabase::Upsert, &DASqlGenerator::GetUpsertSql);
     std::vector<std::shared_ptr<DAUpdateRequest>> updates;
     for (const int qty : {43, 44}) {
@@ -75,84 +135,5 @@ void Writes(const Location& at)
     LibAndRaw(at, "DropTable", {bench::Request<DADropRequest>(at, "write.db", "tmp_drop")}, &DADatabase::DropTable,
               &DASqlGenerator::GetDropTableSql,
               [=] { return bench::RawExec(path, std::string("CREATE TABLE tmp_drop (") + bench::kRowColumns + ")"); });
+    Batches(at);
 }
-
-// batch/Upsert10000/<location>/{lib,raw,single}: one ExecuteBatch; raw: the same texts in one BEGIN
-// IMMEDIATE/COMMIT, as the batch runs them; single: one Upsert (one commit) each, only 500 on disk.
-constexpr int kStatements = 10000;
-
-// use of the upserts of rows 1..count of b in turn, up to the first that does not return 0.
-int EachUpsert(const Location& at, int count, const std::function<int(DAUpsertRequest&)>& use)
-{
-    int rc = 0;
-    for (int i = 1; i <= count && rc == 0; ++i) {
-        DAUpsertRequest request;
-        request.SetPath(at.dir.c_str(), "batch.db");
-        request.SetTable("b");
-        rc = use(Set(request, i, i * 3, i * 0.5, ("row-" + std::to_string(i)).c_str()));
-    }
-    return rc;
-}
-
-int Fill(DABatchRequest& batch, const Location& at)
-{
-    batch.SetPath(at.dir.c_str(), "batch.db");
-    return EachUpsert(at, kStatements, [&](DAUpsertRequest& request) { return batch.Add(request); });
-}
-
-void Batches(const Location& at)
-{
-    const std::string path = at.Path("batch.db");
-    bench::RawExec(path, std::string("CREATE TABLE b (") + bench::kRowColumns + ")");
-    const std::string prefix = "batch/Upsert" + std::to_string(kStatements) + "/" + at.name + "/";
-    double text = 0;
-    EachUpsert(at, kStatements, [&](DAUpsertRequest& request) {
-        std::string sql;
-        DASqlGenerator().GetUpsertSql(request, sql);
-        text += static_cast<double>(sql.size());
-        return 0;
-    });
-    const double before = bench::HeapInUse();
-    DABatchRequest probe;
-    Fill(probe, at);
-    const double held = bench::HeapInUse() - before;
-    const auto lib = [at] {
-        DABatchRequest batch;
-        const int rc = Fill(batch, at);
-        return rc != 0 ? rc : DADatabase().ExecuteBatch(batch);
-    };
-    const auto raw = [path] {
-        sqlite3* db = nullptr;
-        int rc = sqlite3_open(path.c_str(), &db);
-        rc = rc != SQLITE_OK ? rc : sqlite3_exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr);
-        for (int i = 1; rc == SQLITE_OK && i <= kStatements; ++i) {
-            char price[32];
-            std::snprintf(price, sizeof price, "%g", i * 0.5);
-            const std::string sql = "INSERT OR REPLACE INTO b (id, qty, price, label) VALUES ('" + std::to_string(i) +
-                "', '" + std::to_string(i * 3) + "', '" + price + "', 'row-" + std::to_string(i) + "')";
-            rc = sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
-        }
-        rc = rc != SQLITE_OK ? rc : sqlite3_exec(db, "COMMIT", nullptr, nullptr, nullptr);
-        sqlite3_close(db);
-        return rc;
-    };
-    const int calls = at.name == "disk" ? 500 : kStatements;
-    const auto single = [at, calls] {
-        return EachUpsert(at, calls, [](DAUpsertRequest& request) { return DADatabase().Upsert(request); });
-    };
-    bench::Add(prefix + "lib", lib, {{"statements", kStatements}, {"held_bytes", held}, {"text_bytes", text}});
-    bench::Add(prefix + "raw", raw, {{"statements", kStatements}});
-    bench::Add(prefix + "single", single, {{"statements", calls}})->Iterations(1);
-}
-
-void WriteCases(const Location& at)
-{
-    if (!at.dir.empty()) {
-        Writes(at);
-        Batches(at);
-    }
-}
-
-}  // namespace
-
-ULO_BENCH_CASES(WriteCases);

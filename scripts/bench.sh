@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Builds the benchmarks in Release, runs every case and rewrites the results
-# in docs/benchmarks.md (bench/README.md says how cases, targets and report
-# sections are added):
+# in docs/benchmarks.md (which says how cases, targets and sections are
+# added):
 #
 #   scripts/bench.sh                 # everything, about 5 minutes on 2 cores
 #   BUILD_DIR=/path scripts/bench.sh # another build directory
