@@ -249,6 +249,15 @@ const SqlCase kCases[] = {
      "INSERT INTO contacts (name, phone) VALUES ('Kim''s', '010')"},
     {kInsert, kContacts, {{kName, "Kim"}}, {}, "INSERT OR IGNORE INTO contacts (name) VALUES ('Kim')",
      [](DABaseSet& r) { static_cast<DAInsertRequest&>(r).SetIgnoreExisting(); }},
+    {kUpsert, kContacts, {{kName, "Kim"}}, {},
+     "INSERT OR REPLACE INTO contacts (name, photo, email) VALUES ('Kim', X'89504E47', NULL)",
+     [](DABaseSet& r) { r.SetBlob("photo", "\x89PNG", 4), r.SetNull("email"); }},
+    {kUpdate, kContacts, {}, {{kName, "Kim"}}, "UPDATE contacts SET email = NULL WHERE name='Kim'",
+     [](DABaseSet& r) { r.SetNull("email"); }},
+    {kInsert, "t", {{kName, "a"}}, {}, "INSERT INTO t (name, p, q) VALUES ('a', X'', X'00FF0A')",
+     [](DABaseSet& r) { r.SetBlob("p", nullptr, 0), r.SetNull(kName), r.SetBlob("q", "\0\xFF\n", 3), r.SetNull("p"); }},
+    {kUpsert, "t", {}, {}, "INSERT OR REPLACE INTO t (name, phone) VALUES ('n', NULL)",  // the first value wins
+     [](DABaseSet& r) { r.SetNull(kPhone), r.SetData(kPhone, "1"), r.SetData(kName, "n"); }},
 };
 // clang-format on
 

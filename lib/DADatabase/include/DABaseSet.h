@@ -1,6 +1,7 @@
 #ifndef DABASESET_H
 #define DABASESET_H
 
+#include <cstddef>
 #include <cstdint>
 #include <map>
 #include <string>
@@ -66,6 +67,33 @@ public:
     /// and first-value-wins rule as the other setters. Chosen for
     /// std::int64_t arguments; int and double keep their own overloads.
     void SetData(char const* column, std::int64_t value);
+
+    /// A value of the data part that is not text: NULL, or bytes.
+    struct TypedValue {
+        char const* column = nullptr;  ///< the caller's column-name pointer
+        bool null = true;  ///< NULL; otherwise the blob in bytes
+        std::vector<unsigned char> bytes;  ///< the blob's bytes
+    };
+
+    /// Sets column to NULL in the data part: written NULL in the statement.
+    /// Column names are kept by pointer as for SetData, and one pointer
+    /// stands once in the data part: the first value set under it wins,
+    /// whichever setter (SetData, SetNull, SetBlob) set it. Typed values
+    /// are written after the data map's columns, in call order. A null or
+    /// non-plain column name (see SetWhere with an operator) is refused
+    /// with the error line "INVALID COLUMN NAME, VALUE NOT STORED".
+    /// Holds the data map's member lock.
+    void SetNull(char const* column);
+
+    /// Sets column to a blob of the size bytes at data, copied at the call:
+    /// written X'89504E47' (upper-case hex) in the statement, X'' when size
+    /// is 0 (data may then be null). The rules of SetNull; a null data with
+    /// a size is refused with the error line "NULL BLOB, NOT STORED".
+    /// Throws nothing but std::bad_alloc (nothing stored then).
+    void SetBlob(char const* column, void const* data, std::size_t size);
+
+    /// Replaces out by a copy of the typed values in call order.
+    void GetTypedData(std::vector<TypedValue>& out);
 
     ///@{
     /// The same for the where map.
@@ -175,8 +203,13 @@ private:
         bool number;
     };
 
+    // Stores a typed value under the data map's lock unless its column
+    // already has a value.
+    void AddTyped(TypedValue value, const char* func);
+
     DAValueMap m_dataMap;
     DAValueMap m_whereMap;
+    std::vector<TypedValue> m_typed;  // guarded by m_dataMap's lock
     std::vector<StoredCondition> m_conditions;
 };
 

@@ -264,11 +264,25 @@ private:
         for (std::size_t i = 0; rc == SQLITE_OK && i < m_values.size(); ++i) {
             const DALiteral& value = m_values[i];
             const int index = static_cast<int>(i + 1);
-            rc = value.integer ? sqlite3_bind_int64(handle, index, std::strtoll(value.text.c_str(), nullptr, 10))
-                               : sqlite3_bind_text(handle, index, value.text.data(),
-                                                   static_cast<int>(value.text.size()), SQLITE_STATIC);
+            rc = Bind(handle, index, value);
         }
         return rc;
+    }
+
+    static int Bind(sqlite3_stmt* stmt, int index, const DALiteral& value)
+    {
+        const auto size = static_cast<sqlite3_uint64>(value.text.size());
+        switch (value.kind) {
+        case DALiteral::Kind::Integer:
+            return sqlite3_bind_int64(stmt, index, std::strtoll(value.text.c_str(), nullptr, 10));
+        case DALiteral::Kind::Null:
+            return sqlite3_bind_null(stmt, index);
+        case DALiteral::Kind::Blob:
+            return sqlite3_bind_blob64(stmt, index, value.text.data(), size, SQLITE_STATIC);
+        case DALiteral::Kind::Text:
+            break;
+        }
+        return sqlite3_bind_text64(stmt, index, value.text.data(), size, SQLITE_STATIC, SQLITE_UTF8);
     }
 
     DASessionState& m_state;

@@ -29,6 +29,27 @@ void AppendLiteral(std::string& sql, const std::string& value)
     sql += '\'';
 }
 
+// Appends a typed value as it stands in SQL: NULL, or the blob as
+// X'0A1B' (upper-case hex, X'' when empty).
+void AppendTyped(std::string& sql, const DABaseSet::TypedValue& value)
+{
+    if (value.null) {
+        sql += "NULL";
+        return;
+    }
+    static const char kHex[] = "0123456789ABCDEF";
+    const std::size_t start = sql.size();
+    sql.resize(start + 2 * value.bytes.size() + 3);
+    char* out = &sql[start];
+    *out++ = 'X';
+    *out++ = '\'';
+    for (const unsigned char byte : value.bytes) {
+        *out++ = kHex[byte >> 4U];
+        *out++ = kHex[byte & 0xFU];
+    }
+    *out = '\'';
+}
+
 // Appends one listed condition: "ts<1700000000000", "k IN ('a', 'b')",
 // "v IS NULL".
 void AppendCondition(std::string& sql, const DABaseSet::Condition& condition)
@@ -92,12 +113,14 @@ void AppendWhere(std::string& sql, DABaseSet& request, bool always)
     CutAtLast(sql, " AND");
 }
 
-// "<head>t (a, b) VALUES ('1', '2')", the data map in map order: the
-// insert statements' shared shape.
+// "<head>t (a, b) VALUES ('1', '2')", the data map in map order, then the
+// typed values in call order: the insert statements' shared shape.
 void WriteInsert(const char* head, DABaseSet& request, const std::string& table, std::string& sql)
 {
     DAValueMap data;
+    std::vector<DABaseSet::TypedValue> typed;
     request.GetDataMap(data);
+    request.GetTypedData(typed);
 
     std::string columns = " (";
     std::string values = "VALUES (";
@@ -105,6 +128,12 @@ void WriteInsert(const char* head, DABaseSet& request, const std::string& table,
         columns += entry.first;
         columns += ", ";
         AppendLiteral(values, entry.second);
+        values += ", ";
+    }
+    for (const auto& value : typed) {
+        columns += value.column;
+        columns += ", ";
+        AppendTyped(values, value);
         values += ", ";
     }
     CutAtLast(columns, ", ");
@@ -282,14 +311,22 @@ void DASqlGenerator::GetUpdateSql(DAUpdateRequest& request, std::string& sql)
 {
     std::string table;
     DAValueMap data;
+    std::vector<DABaseSet::TypedValue> typed;
     request.GetTable(table);
     request.GetDataMap(data);
+    request.GetTypedData(typed);
 
     std::string text = "UPDATE " + table + " SET ";
     for (const auto& entry : data) {
         text += entry.first;
         text += " = ";
         AppendLiteral(text, entry.second);
+        text += ", ";
+    }
+    for (const auto& value : typed) {
+        text += value.column;
+        text += " = ";
+        AppendTyped(text, value);
         text += ", ";
     }
     CutAtLast(text, ", ");

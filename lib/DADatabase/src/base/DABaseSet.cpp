@@ -1,5 +1,6 @@
 #include "DABaseSet.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <cmath>
@@ -112,17 +113,28 @@ bool Accepted(char const* column, const char* valueFailure, const char* func)
     return true;
 }
 
+bool HasColumn(const std::vector<DABaseSet::TypedValue>& typed, char const* column)
+{
+    return std::any_of(typed.begin(), typed.end(),
+                       [column](const DABaseSet::TypedValue& value) { return value.column == column; });
+}
+
 // The one insertion all the setters make: refuse a null column, then build
-// the text and insert it if the key is new, all under the map's lock.
+// the text and insert it if the key is new, all under the map's lock. A
+// data map's column set already by a typed setter (typed holds them, under
+// the same lock) keeps that value.
 template <typename Value>
-void Store(DAValueMap& map, char const* column, Value value, const char* func)
+void Store(DAValueMap& map, char const* column, Value value, const char* func,
+           const std::vector<DABaseSet::TypedValue>* typed = nullptr)
 {
     if (column == nullptr) {
         DA_LOG_AT(DLOG_ERROR, func, "NULL COLUMN NAME, VALUE NOT STORED");
         return;
     }
     const DAMemberLock lock(&map, DA_FILE_NAME, func, __LINE__);
-    map.emplace(column, ValueText(value));
+    if (typed == nullptr || typed->empty() || !HasColumn(*typed, column)) {
+        map.emplace(column, ValueText(value));
+    }
 }
 
 }  // namespace
@@ -136,22 +148,22 @@ DABaseSet::DABaseSet()
 
 void DABaseSet::SetData(char const* column, char const* value)
 {
-    Store(m_dataMap, column, value, __func__);
+    Store(m_dataMap, column, value, __func__, &m_typed);
 }
 
 void DABaseSet::SetData(char const* column, int value)
 {
-    Store(m_dataMap, column, value, __func__);
+    Store(m_dataMap, column, value, __func__, &m_typed);
 }
 
 void DABaseSet::SetData(char const* column, double value)
 {
-    Store(m_dataMap, column, value, __func__);
+    Store(m_dataMap, column, value, __func__, &m_typed);
 }
 
 void DABaseSet::SetData(char const* column, std::int64_t value)
 {
-    Store(m_dataMap, column, value, __func__);
+    Store(m_dataMap, column, value, __func__, &m_typed);
 }
 
 void DABaseSet::SetWhere(char const* column, char const* value)
@@ -187,7 +199,7 @@ void DABaseSet::GetWhereMap(DAValueMap& out)
 void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::int64_t value)
 {
     if (target == Target::Data) {
-        Store(m_dataMap, column, value, "SetData");
+        Store(m_dataMap, column, value, "SetData", &m_typed);
     } else if (target == Target::Where) {
         Store(m_whereMap, column, value, "SetWhere");
     } else {
@@ -198,7 +210,7 @@ void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::in
 void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::uint64_t value)
 {
     if (target == Target::Data) {
-        Store(m_dataMap, column, value, "SetData");
+        Store(m_dataMap, column, value, "SetData", &m_typed);
     } else if (target == Target::Where) {
         Store(m_whereMap, column, value, "SetWhere");
     } else if (Accepted(column, nullptr, "SetWhere")) {
@@ -266,4 +278,40 @@ void DABaseSet::GetConditions(std::vector<Condition>& out)
         copy.push_back({stored.column.Get(), stored.form, stored.op, stored.values, stored.number});
     }
     out = std::move(copy);
+}
+
+void DABaseSet::AddTyped(TypedValue value, const char* func)
+{
+    const DAMemberLock lock(&m_dataMap, DA_FILE_NAME, func, __LINE__);
+    if (m_dataMap.count(value.column) == 0 && !HasColumn(m_typed, value.column)) {
+        m_typed.push_back(std::move(value));
+    }
+}
+
+void DABaseSet::SetNull(char const* column)
+{
+    if (!DAIsPlainName(column)) {
+        DA_LOG(DLOG_ERROR, "INVALID COLUMN NAME, VALUE NOT STORED");
+        return;
+    }
+    AddTyped({column, true, {}}, __func__);
+}
+
+void DABaseSet::SetBlob(char const* column, void const* data, std::size_t size)
+{
+    if (!DAIsPlainName(column)) {
+        DA_LOG(DLOG_ERROR, "INVALID COLUMN NAME, VALUE NOT STORED");
+        return;
+    }
+    if (data == nullptr && size > 0) {
+        DA_LOG(DLOG_ERROR, "NULL BLOB, NOT STORED");
+        return;
+    }
+    const auto* bytes = static_cast<const unsigned char*>(data);
+    AddTyped({column, false, std::vector<unsigned char>(bytes, bytes + size)}, __func__);
+}
+
+void DABaseSet::GetTypedData(std::vector<TypedValue>& out)
+{
+    out = m_typed;
 }
