@@ -2,6 +2,7 @@
 #define DADATABASE_H
 
 #include <cstdint>
+#include <functional>
 #include <string>
 
 #include <sqlite3.h>
@@ -17,7 +18,9 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DARow.h"
 #include "DASelectRequest.h"
+#include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
@@ -100,6 +103,25 @@ public:
     /// "QUERY FAILED[rc]: SQLite's text"; the rows read before it stay in
     /// the cursor.
     int Query(DAQueryRequest& request, DACursor& cursor);
+
+    /// Query into a typed cursor: the same statement, codes and lines (under
+    /// "Query"), each value kept with its stored type and bytes (DARow.h).
+    /// A failure before the first step (open, preparation) leaves cursor as
+    /// it was; otherwise it holds the rows read, positioned before the
+    /// first (-1), with the step failure's code returned after the rows read
+    /// before it.
+    int Query(DAQueryRequest& request, DATypedCursor& cursor);
+
+    /// Query's statement, codes and lines (under "QueryEach"), handing the
+    /// rows to visit one at a time: memory does not grow with the rows. The
+    /// row is valid during the call only. visit returning false ends the
+    /// read with 0; a step failure returns its code after the rows before
+    /// it were visited. An exception from visit passes through, after the
+    /// statement is finalized and the file closed. The file is read
+    /// (locked against writers, unless it is in WAL mode) until the read
+    /// ends: a write to it from visit meets that lock, as another
+    /// connection would (busy-retry, then 5).
+    int QueryEach(DAQueryRequest& request, std::function<bool(DARow const&)> const& visit);
 
     /// exists: whether a table named exactly tableName exists. A null
     /// tableName throws std::logic_error (the connection is closed first).

@@ -2,6 +2,7 @@
 #define DASESSION_H
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 
 #include "DAAddColumnRequest.h"
@@ -15,7 +16,9 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DARow.h"
 #include "DASelectRequest.h"
+#include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
@@ -138,7 +141,19 @@ public:
     int Select(DASelectRequest& request, DACursor& cursor);
     int JoinSelect(DAJoinRequest& request, DACursor& cursor);
     int Query(DAQueryRequest& request, DACursor& cursor);
+    int Query(DAQueryRequest& request, DATypedCursor& cursor);
     ///@}
+
+    /// DADatabase::QueryEach on the session's file (a read: a reader
+    /// connection with the log, the writer without it). An exception from
+    /// visit passes through after the statement is reset and the connection
+    /// returned. From visit, on the reading thread, the session's reads
+    /// run; with the log its writes run too (the read keeps seeing the rows
+    /// as they were when it began). Without the log the read holds the one
+    /// connection, and any operation from visit is refused with 21 and the
+    /// error line "SESSION BUSY ON THIS THREAD". Open, Close and the setters
+    /// must not be called from visit: they wait for the read to end.
+    int QueryEach(DAQueryRequest& request, std::function<bool(DARow const&)> const& visit);
 
     /// exists: whether a table named exactly tableName exists in the
     /// session's file. A null tableName throws std::logic_error.

@@ -116,6 +116,18 @@ int DADatabase::Query(DAQueryRequest& request, DACursor& cursor)
     return DAOperations::Query(visit, request, cursor);
 }
 
+int DADatabase::Query(DAQueryRequest& request, DATypedCursor& cursor)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Query(visit, request, cursor);
+}
+
+int DADatabase::QueryEach(DAQueryRequest& request, std::function<bool(DARow const&)> const& visit)
+{
+    DAVisit source(*this, __LINE__);
+    return DAOperations::QueryEach(source, request, visit);
+}
+
 int DADatabase::CheckExistTable(DABasePath& location, char const* tableName, bool& exists)
 {
     DAVisit visit(*this, __LINE__);

@@ -12,6 +12,8 @@
 #include "DALog.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
+#include "DAStepRows.h"
+#include "DATypedStore.h"
 
 void DALeaseEnd::operator()(sqlite3* db) const noexcept
 {
@@ -109,24 +111,20 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
     return parse(parser, db.get(), stmt.get());
 }
 
-// A query whose rows fill cursor; step failures are logged by the parser,
-// and returned (with the line "<word> FAILED[rc]: text") when
+// A query whose rows rows(parser, db, stmt, failure) reads, returning
+// SQLITE_DONE when it read them all; step failures are logged by the
+// parser, and returned (with the line "<word> FAILED[rc]: text") when
 // returnStepFailure.
-template <typename Request>
-int RunCursorQuery(DAConnectionSource& source, Request& request,
-                   void (DASqlGenerator::*generate)(Request&, std::string&), DACursor& cursor, const char* func,
-                   const char* word, bool logOpenFailure, bool returnStepFailure = false)
+template <typename Request, typename Rows>
+int RunRowsQuery(DAConnectionSource& source, Request& request, void (DASqlGenerator::*generate)(Request&, std::string&),
+                 const char* func, const char* word, bool logOpenFailure, bool returnStepFailure, Rows rows)
 {
     return RunQuery(
         source, request, [&](std::string& sql) { (DASqlGenerator().*generate)(request, sql); },
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) {
-            if (!returnStepFailure) {
-                parser.ParseDatabase(db, stmt, cursor);
-                return SQLITE_OK;
-            }
             std::string failure;
-            const int rc = parser.ParseRows(db, stmt, cursor, failure);
-            if (rc == SQLITE_DONE) {
+            const int rc = rows(parser, db, stmt, failure);
+            if (rc == SQLITE_DONE || !returnStepFailure) {
                 return SQLITE_OK;
             }
             DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
@@ -134,6 +132,39 @@ int RunCursorQuery(DAConnectionSource& source, Request& request,
             return rc;
         },
         func, word, logOpenFailure);
+}
+
+// A query whose rows fill cursor.
+template <typename Request>
+int RunCursorQuery(DAConnectionSource& source, Request& request,
+                   void (DASqlGenerator::*generate)(Request&, std::string&), DACursor& cursor, const char* func,
+                   const char* word, bool logOpenFailure, bool returnStepFailure = false)
+{
+    return RunRowsQuery(source, request, generate, func, word, logOpenFailure, returnStepFailure,
+                        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure) {
+                            return parser.ParseRows(db, stmt, cursor, failure);
+                        });
+}
+
+// The typed reads' rows: Query's into a whole store, QueryEach's one at a
+// time into a store whose buffers every row reuses.
+struct EachRow {
+    DATypedStore& store;
+    const std::function<bool(DARow const&)>& visit;
+};
+
+int AppendRow(void* store, sqlite3_stmt* stmt)
+{
+    return static_cast<DATypedStore*>(store)->Append(stmt);
+}
+
+int VisitRow(void* user, sqlite3_stmt* stmt)
+{
+    auto& each = *static_cast<EachRow*>(user);
+    each.store.Clear(true);
+    const int rc = each.store.Append(stmt);
+    each.store.position = 0;
+    return rc != SQLITE_ROW ? rc : each.visit(each.store.row) ? SQLITE_ROW : SQLITE_DONE;
 }
 
 // The transaction core of batches and migrations, on a held connection:
@@ -318,6 +349,34 @@ int DAOperations::JoinSelect(DAConnectionSource& source, DAJoinRequest& request,
 int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DACursor& cursor)
 {
     return RunCursorQuery(source, request, &DASqlGenerator::GetQuerySql, cursor, "Query", "QUERY", true, true);
+}
+
+int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DATypedCursor& cursor)
+{
+    return RunRowsQuery(source, request, &DASqlGenerator::GetQuerySql, "Query", "QUERY", true, true,
+                        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure) {
+                            if (cursor.m_store == nullptr) {  // moved from
+                                cursor.m_store = std::make_unique<DATypedStore>();
+                            }
+                            DATypedStore& store = *cursor.m_store;
+                            store.Clear(false);
+                            const int rc = DAStepRows(parser, db, stmt, failure, &store, AppendRow);
+                            if (store.rows == 0) {
+                                store.TakeNames(stmt);
+                            }
+                            return rc;
+                        });
+}
+
+int DAOperations::QueryEach(DAConnectionSource& source, DAQueryRequest& request,
+                            const std::function<bool(DARow const&)>& visit)
+{
+    return RunRowsQuery(source, request, &DASqlGenerator::GetQuerySql, "QueryEach", "QUERY", true, true,
+                        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure) {
+                            DATypedStore store;
+                            EachRow each{store, visit};
+                            return DAStepRows(parser, db, stmt, failure, &each, VisitRow);
+                        });
 }
 
 int DAOperations::CheckExistTable(DAConnectionSource& source, DABasePath& location, char const* tableName, bool& exists)

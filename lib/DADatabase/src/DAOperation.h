@@ -7,6 +7,7 @@
 // DAConnectionSource.
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <string>
 
@@ -23,8 +24,10 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DARow.h"
 #include "DASelectRequest.h"
 #include "DASqliteHandles.h"
+#include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
@@ -110,6 +113,9 @@ struct DAOperations {
     static int Select(DAConnectionSource& source, DASelectRequest& request, DACursor& cursor);
     static int JoinSelect(DAConnectionSource& source, DAJoinRequest& request, DACursor& cursor);
     static int Query(DAConnectionSource& source, DAQueryRequest& request, DACursor& cursor);
+    static int Query(DAConnectionSource& source, DAQueryRequest& request, DATypedCursor& cursor);
+    static int QueryEach(DAConnectionSource& source, DAQueryRequest& request,
+                         const std::function<bool(DARow const&)>& visit);
     static int CheckExistTable(DAConnectionSource& source, DABasePath& location, char const* tableName, bool& exists);
     static int CreateIndex(DAConnectionSource& source, DACreateIndexRequest& request);
     static int AddColumn(DAConnectionSource& source, DAAddColumnRequest& request);

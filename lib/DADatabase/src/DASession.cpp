@@ -67,6 +67,9 @@ struct DASessionState {
 
 namespace {
 
+// The session whose writer this thread holds, if any.
+thread_local const DASessionState* t_writerHeld = nullptr;
+
 // The session's connection source, one per operation (on its stack).
 class DASessionSource : public DAConnectionSource {
 public:
@@ -83,7 +86,14 @@ public:
             return rc;
         }
         if (access == DAAccess::Write || !m_state.walActive) {
+            // Only a visit of this thread's own read can get here holding
+            // the writer: locking again would never return.
+            if (t_writerHeld == &m_state) {
+                DA_LOG_WHERE(DLOG_ERROR, File(), func, Line(), "SESSION BUSY ON THIS THREAD");
+                return SQLITE_MISUSE;
+            }
             m_state.writeMutex.lock();
+            t_writerHeld = &m_state;
             lease = DALease(m_state.writer.get(), DALeaseEnd{this});
             return SQLITE_OK;
         }
@@ -111,6 +121,7 @@ public:
             if (std::exchange(m_state.touched, false)) {
                 ++m_state.generation;
             }
+            t_writerHeld = nullptr;
             m_state.writeMutex.unlock();
             return;
         }
@@ -483,6 +494,18 @@ int DASession::Query(DAQueryRequest& request, DACursor& cursor)
 {
     DASessionCall source(*m_state, __LINE__);
     return DAOperations::Query(source, request, cursor);
+}
+
+int DASession::Query(DAQueryRequest& request, DATypedCursor& cursor)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::Query(source, request, cursor);
+}
+
+int DASession::QueryEach(DAQueryRequest& request, std::function<bool(DARow const&)> const& visit)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::QueryEach(source, request, visit);
 }
 
 int DASession::CheckExistTable(char const* tableName, bool& exists)
