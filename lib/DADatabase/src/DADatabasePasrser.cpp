@@ -5,6 +5,7 @@
 
 #include "DABusyRetry.h"
 #include "DALog.h"
+#include "DAParseRows.h"
 #include "DAStepRows.h"
 
 namespace {
@@ -64,7 +65,12 @@ void DADatabaseParser::ParseDatabase(sqlite3* db, sqlite3_stmt* stmt, DACursor& 
 
 int DADatabaseParser::ParseRows(sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor, std::string& failure)
 {
-    cursor.Initialize();
+    return DAParseRows(*this, db, stmt, cursor, failure, false);
+}
+
+int DAParseRows(DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor, std::string& failure,
+                bool mayBeStale)
+{
     // The column names, copied once from the first row: SQLite's name of a
     // column does not change while a statement prepared by sqlite3_prepare
     // runs, and asking for it again for every value costs a lock of the
@@ -74,7 +80,8 @@ int DADatabaseParser::ParseRows(sqlite3* db, sqlite3_stmt* stmt, DACursor& curso
         std::vector<std::string> names;
         bool registered;
     } rows{cursor, {}, false};
-    return DAStepRows(*this, db, stmt, failure, &rows, [](void* user, sqlite3_stmt* row) {
+    const auto start = [](void* user) { static_cast<Rows*>(user)->cursor.Initialize(); };
+    return DAStepRows(parser, db, stmt, failure, &rows, mayBeStale, start, [](void* user, sqlite3_stmt* row) {
         const char* const func = "ParseDatabase";
         Rows& to = *static_cast<Rows*>(user);
         if (!to.registered) {
@@ -109,13 +116,23 @@ int DADatabaseParser::ParseRows(sqlite3* db, sqlite3_stmt* stmt, DACursor& curso
 }
 
 int DAStepRows(DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, void* user,
-               DARowSink onRow)
+               bool mayBeStale, void (*onStart)(void* user), DARowSink onRow)
 {
     const char* const func = "ParseDatabase";
     DABusyRetry<DADatabaseParser> retry(parser);
+    bool first = true;  // until the first step that was not busy
     int failed = SQLITE_OK;  // the failed step's code, once known
     for (;;) {
         const int rc = sqlite3_step(stmt);
+        if (first && (rc != SQLITE_BUSY || retry.Stopped())) {
+            first = false;
+            // SQLite marks a statement expired when it met a schema newer
+            // than its own and could not be prepared again against it.
+            if (mayBeStale && rc != SQLITE_ROW && rc != SQLITE_DONE && sqlite3_expired(stmt) != 0) {
+                return kDAStaleStatement;
+            }
+            onStart(user);
+        }
         if (rc == SQLITE_DONE && failed == SQLITE_OK) {
             return rc;
         }

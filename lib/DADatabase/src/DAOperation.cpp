@@ -10,6 +10,7 @@
 #include "DABusyRetry.h"
 #include "DADatabaseParser.h"
 #include "DALog.h"
+#include "DAParseRows.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
 #include "DAStepRows.h"
@@ -81,10 +82,13 @@ int RunWrite(DAConnectionSource& source, Request& request, void (DASqlGenerator:
 }
 
 // The query frame: acquire for reading, generate, prepare under busy-retry,
-// and on success return parse(parser, db, stmt); on failure log "<word>
-// FAILED[rc]: text" under func and return the preparation's code. When no
-// connection can be had, logs "OpenDB Error: rc" (info) if logOpenFailure
-// and returns that code.
+// and on success return parse(parser, db, stmt, mayBeStale); on failure log
+// "<word> FAILED[rc]: text" under func and return the preparation's code.
+// A statement the source kept from before a schema change it cannot follow
+// (parse gave kDAStaleStatement) is prepared again from the text, so that
+// the operation ends as on a fresh connection. When no connection can be
+// had, logs "OpenDB Error: rc" (info) if logOpenFailure and returns that
+// code.
 template <typename Generate, typename Parse>
 int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate, Parse parse, const char* func,
              const char* word, bool logOpenFailure)
@@ -101,17 +105,25 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
     generate(sql);
 
     DAStatementLease stmt;
-    const int rc = source.Prepare(db.get(), sql.c_str(), stmt);
-    if (rc != SQLITE_OK) {
-        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
-                     sqlite3_errmsg(db.get()));
-        return rc;
-    }
     DADatabaseParser parser;
-    return parse(parser, db.get(), stmt.get());
+    int rc = source.Prepare(db.get(), sql.c_str(), stmt);
+    if (rc == SQLITE_OK) {
+        rc = parse(parser, db.get(), stmt.get(), source.MayBeStale());
+        if (rc != kDAStaleStatement) {
+            return rc;
+        }
+        stmt.reset();
+        rc = source.DAConnectionSource::Prepare(db.get(), sql.c_str(), stmt);
+        if (rc == SQLITE_OK) {
+            return parse(parser, db.get(), stmt.get(), false);
+        }
+    }
+    DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
+                 sqlite3_errmsg(db.get()));
+    return rc;
 }
 
-// A query whose rows rows(parser, db, stmt, failure) reads, returning
+// A query whose rows rows(parser, db, stmt, failure, mayBeStale) reads, returning
 // SQLITE_DONE when it read them all; step failures are logged by the
 // parser, and returned (with the line "<word> FAILED[rc]: text") when
 // returnStepFailure.
@@ -121,14 +133,16 @@ int RunRowsQuery(DAConnectionSource& source, Request& request, void (DASqlGenera
 {
     return RunQuery(
         source, request, [&](std::string& sql) { (DASqlGenerator().*generate)(request, sql); },
-        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) {
+        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, bool mayBeStale) {
             std::string failure;
-            const int rc = rows(parser, db, stmt, failure);
-            if (rc == SQLITE_DONE || !returnStepFailure) {
+            const int rc = rows(parser, db, stmt, failure, mayBeStale);
+            if (rc == SQLITE_DONE || (rc != kDAStaleStatement && !returnStepFailure)) {
                 return SQLITE_OK;
             }
-            DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
-                         failure.c_str());
+            if (rc != kDAStaleStatement) {
+                DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
+                             failure.c_str());
+            }
             return rc;
         },
         func, word, logOpenFailure);
@@ -141,9 +155,8 @@ int RunCursorQuery(DAConnectionSource& source, Request& request,
                    const char* word, bool logOpenFailure, bool returnStepFailure = false)
 {
     return RunRowsQuery(source, request, generate, func, word, logOpenFailure, returnStepFailure,
-                        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure) {
-                            return parser.ParseRows(db, stmt, cursor, failure);
-                        });
+                        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure,
+                            bool mayBeStale) { return DAParseRows(parser, db, stmt, cursor, failure, mayBeStale); });
 }
 
 // The typed reads' rows: Query's into a whole store, QueryEach's one at a
@@ -175,10 +188,32 @@ int VisitRow(void* user, sqlite3_stmt* stmt)
 // with step where it stopped (0 the begin or decide, 1..count the
 // statements, count + 1 finish or the commit) and error the text of a
 // failed exec.
+// Rolls back whatever transaction db still has open when it goes out of
+// scope: a failure, a stop, or an exception (std::bad_alloc) passing
+// through. A held connection must never carry a transaction into its next
+// operation, whose acknowledged write would then be lost with it.
+class DARollbackGuard {
+public:
+    explicit DARollbackGuard(sqlite3* db) : m_db(db) {}
+    ~DARollbackGuard()
+    {
+        // Some failures end the transaction inside SQLite already.
+        if (sqlite3_get_autocommit(m_db) == 0) {
+            sqlite3_exec(m_db, "ROLLBACK", nullptr, nullptr, nullptr);
+        }
+    }
+    DARollbackGuard(const DARollbackGuard&) = delete;
+    DARollbackGuard& operator=(const DARollbackGuard&) = delete;
+
+private:
+    sqlite3* m_db;
+};
+
 template <typename Decide, typename Finish>
 int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, int count, DAErrorText& error, int& step,
                    Decide decide, Finish finish)
 {
+    const DARollbackGuard rollback(db);
     // IMMEDIATE takes the write lock now, so a busy file shows (and is
     // waited for) before any statement runs.
     step = 0;
@@ -198,10 +233,6 @@ int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, i
     }
     if (rc == SQLITE_OK) {
         rc = ExecWhileBusy(source, db, "COMMIT", error);
-    }
-    // Some failures end the transaction inside SQLite already.
-    if (rc != SQLITE_OK && sqlite3_get_autocommit(db) == 0) {
-        sqlite3_exec(db, "ROLLBACK", nullptr, nullptr, nullptr);
     }
     return rc;
 }
@@ -353,30 +384,33 @@ int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DAC
 
 int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DATypedCursor& cursor)
 {
-    return RunRowsQuery(source, request, &DASqlGenerator::GetQuerySql, "Query", "QUERY", true, true,
-                        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure) {
-                            if (cursor.m_store == nullptr) {  // moved from
-                                cursor.m_store = std::make_unique<DATypedStore>();
-                            }
-                            DATypedStore& store = *cursor.m_store;
-                            store.Clear(false);
-                            const int rc = DAStepRows(parser, db, stmt, failure, &store, AppendRow);
-                            if (store.rows == 0) {
-                                store.TakeNames(stmt);
-                            }
-                            return rc;
-                        });
+    return RunRowsQuery(
+        source, request, &DASqlGenerator::GetQuerySql, "Query", "QUERY", true, true,
+        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, bool mayBeStale) {
+            if (cursor.m_store == nullptr) {  // moved from
+                cursor.m_store = std::make_unique<DATypedStore>();
+            }
+            DATypedStore& store = *cursor.m_store;
+            const auto start = [](void* user) { static_cast<DATypedStore*>(user)->Clear(false); };
+            const int rc = DAStepRows(parser, db, stmt, failure, &store, mayBeStale, start, AppendRow);
+            if (rc != kDAStaleStatement && store.rows == 0) {
+                store.TakeNames(stmt);
+            }
+            return rc;
+        });
 }
 
 int DAOperations::QueryEach(DAConnectionSource& source, DAQueryRequest& request,
                             const std::function<bool(DARow const&)>& visit)
 {
-    return RunRowsQuery(source, request, &DASqlGenerator::GetQuerySql, "QueryEach", "QUERY", true, true,
-                        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure) {
-                            DATypedStore store;
-                            EachRow each{store, visit};
-                            return DAStepRows(parser, db, stmt, failure, &each, VisitRow);
-                        });
+    return RunRowsQuery(
+        source, request, &DASqlGenerator::GetQuerySql, "QueryEach", "QUERY", true, true,
+        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, bool mayBeStale) {
+            DATypedStore store;
+            EachRow each{store, visit};
+            return DAStepRows(
+                parser, db, stmt, failure, &each, mayBeStale, [](void* /*user*/) {}, VisitRow);
+        });
 }
 
 int DAOperations::CheckExistTable(DAConnectionSource& source, DABasePath& location, char const* tableName, bool& exists)
@@ -391,7 +425,7 @@ int DAOperations::CheckExistTable(DAConnectionSource& source, DABasePath& locati
             }
             DASqlGenerator().GetCheckTableSql(tableName, sql);
         },
-        [&](DADatabaseParser& parser, sqlite3* /*db*/, sqlite3_stmt* stmt) {
+        [&](DADatabaseParser& parser, sqlite3* /*db*/, sqlite3_stmt* stmt, bool /*mayBeStale*/) {
             parser.ParseExistTable(stmt, exists);
             return SQLITE_OK;
         },
