@@ -193,6 +193,45 @@ const OperationCase kOperations[] = {
          rc = rc * 10 + RUN(t, Select, select, cursor);
          return rc * 10 + RUN(t, Query, query, cursor) + RUN(t, Select, select, cursor);
      }},
+    {"keeping_rows_counters_row_ids_applied_steps",
+     [](Target& t, const std::string& dir, DACursor& cursor) {
+         DAUpsertRequest keep;  // updates row 1 in place: its phone stays
+         At(keep, dir, "contacts").SetData("_ID", 1);
+         keep.SetData("name", "Cho");
+         keep.AddConflictKey("_ID");
+         DAUpsertRequest replace;  // replaces row 2: its phone is gone
+         At(replace, dir, "contacts").SetData("_ID", 2);
+         replace.SetData("name", "Min");
+         DAUpdateRequest counter;
+         Make(counter, dir, "groups", "title", "Work").SetIncrement("_ID", 10);
+         DAInsertRequest added;
+         DAInsertRequest ignored;
+         At(added, dir, "groups").SetData("title", "Club");
+         At(ignored, dir, "groups").SetData("_ID", 1);
+         ignored.SetIgnoreExisting();
+         DABatchRequest step;
+         At(step, dir).Add(added);
+         step.Add(counter);
+         step.Add(ignored);
+         step.Add(added);
+         bool applied[2] = {false, true};
+         int rc = RUN(t, Upsert, keep) + RUN(t, Upsert, replace) + RUN(t, Update, counter);
+         rc = rc * 10 + RUN(t, Migrate, step, 1, applied[0]) + RUN(t, Migrate, step, 1, applied[1]);
+         rc = rc * 10 + RUN(t, ExecuteBatch, step);
+         std::vector<std::int64_t> ids;
+         step.GetRowIds(ids);
+         std::string state = std::to_string(applied[0]) + std::to_string(applied[1]);
+         for (const std::int64_t id : ids) {
+             state += " " + std::to_string(id);
+         }
+         RawDb raw(dir + "/t.db");
+         state +=
+             " / " + raw.Query("SELECT * FROM contacts WHERE _ID < 3") + " / " + raw.Query("SELECT _ID FROM groups");
+         EXPECT_EQ("10 24 -1 33 / 1|Cho|010;2|Min|NULL / 1;13;23;24;32;33", state);
+         cursor.SetColumn("state");
+         cursor.SetData("state", state.c_str());
+         return rc;
+     }},
     {"batch",
      [](Target& t, const std::string& dir, DACursor&) {
          DABatchRequest batch;
@@ -287,6 +326,10 @@ TEST_F(SessionTest, RefusesWithOneLine)
     EXPECT_EQ(21, session.CheckExistTable("contacts", exists));
     EXPECT_EQ(14, OpenAt(session, PathOf("missing")));
     EXPECT_FALSE(FileExists("missing"));
+    session.SetCreate(false);  // a file that does not exist is not made
+    EXPECT_EQ(14, OpenAt(session, Dir()));
+    EXPECT_FALSE(FileExists("t.db"));
+    session.SetCreate(true);
     EXPECT_FALSE(session.IsOpen());
     std::ofstream(PathOf("text.db")) << std::string(5000, 'x');
     DABasePath text;
@@ -308,6 +351,7 @@ TEST_F(SessionTest, RefusesWithOneLine)
     };
     EXPECT_EQ(
         (Strings{line(6, "Upsert", "SESSION NOT OPEN"), line(6, "CheckExistTable", "SESSION NOT OPEN"),
+                 line(6, "Open", "DB open failed. Error no(14): unable to open database file"),
                  line(6, "Open", "DB open failed. Error no(14): unable to open database file"),
                  line(6, "Open", "DB open failed. Error no(26): file is not a database"),
                  line(6, "Select",

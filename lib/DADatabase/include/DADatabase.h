@@ -167,6 +167,11 @@ public:
     /// order, at every start.
     int Migrate(DABatchRequest& step, int version);
 
+    /// Migrate, telling what it did: applied is true only when this call
+    /// ran the step (its "Migrate SUCCESS" line), false otherwise, also
+    /// when another process ran it first.
+    int Migrate(DABatchRequest& step, int version, bool& applied);
+
     /// The size of location's file and the part of it its free pages take,
     /// in bytes (page count and free-list count times the page size).
     /// Codes and lines as GetVersion ("GetSpace FAILED[rc]: text"); both

@@ -118,9 +118,14 @@ public:
     /// log needs room), and Close leaves the log for the next opener; the
     /// file keeps every acknowledged row. Set a budget below the free space
     /// where the disk may fill, so that deletes keep working.
+    ///
+    /// SetCreate (default true): false makes Open of a missing file fail
+    /// with 14 and Open's failure line, creating nothing, so that a
+    /// misspelled name does not make an empty file.
     void SetWal(bool wal);
     void SetSyncOnCommit(bool sync);
     void SetSizeLimit(std::int64_t bytes);
+    void SetCreate(bool create);
     ///@}
 
     /// Opens location's file (creating a missing file) under busy-retry, with
@@ -182,6 +187,7 @@ public:
     int AddColumn(DAAddColumnRequest& request);
     int GetVersion(int& version);
     int Migrate(DABatchRequest& step, int version);
+    int Migrate(DABatchRequest& step, int version, bool& applied);
     int GetSpace(std::int64_t& fileBytes, std::int64_t& freeBytes);
     int Compact();
     ///@}

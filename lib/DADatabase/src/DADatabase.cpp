@@ -155,7 +155,14 @@ int DADatabase::GetVersion(DABasePath& location, int& version)
 int DADatabase::Migrate(DABatchRequest& step, int version)
 {
     DAVisit visit(*this, __LINE__);
-    return DAOperations::Migrate(visit, step, version);
+    bool applied = false;
+    return DAOperations::Migrate(visit, step, version, applied);
+}
+
+int DADatabase::Migrate(DABatchRequest& step, int version, bool& applied)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Migrate(visit, step, version, applied);
 }
 
 int DADatabase::GetSpace(DABasePath& location, std::int64_t& fileBytes, std::int64_t& freeBytes)

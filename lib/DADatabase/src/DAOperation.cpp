@@ -6,6 +6,7 @@
 #include <cstring>
 #include <stdexcept>
 #include <string>
+#include <vector>
 
 #include "DABusyRetry.h"
 #include "DADatabaseParser.h"
@@ -209,9 +210,13 @@ private:
     sqlite3* m_db;
 };
 
-template <typename Decide, typename Finish>
+struct NoStatementFollowUp {
+    void operator()(int /*step*/) const {}
+};
+
+template <typename Decide, typename Finish, typename After = NoStatementFollowUp>
 int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, int count, DAErrorText& error, int& step,
-                   Decide decide, Finish finish)
+                   Decide decide, Finish finish, After after = After())
 {
     const DARollbackGuard rollback(db);
     // IMMEDIATE takes the write lock now, so a busy file shows (and is
@@ -225,6 +230,9 @@ int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, i
     while (rc == SQLITE_OK && step < count) {
         ++step;
         rc = source.Execute(db, sql, error);
+        if (rc == SQLITE_OK) {
+            after(step);
+        }
         sql += std::strlen(sql) + 1;
     }
     if (rc == SQLITE_OK) {
@@ -334,6 +342,7 @@ int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch
 {
     const char* const func = "ExecuteBatch";
     const int count = batch.m_count;
+    batch.m_rowIds.clear();
     if (count == 0) {
         return SQLITE_OK;
     }
@@ -346,6 +355,8 @@ int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch
     int step = 0;
     int before = 0;
     int changes = 0;
+    std::vector<std::int64_t> ids;
+    ids.reserve(batch.m_inserts.size());
     rc = RunTransaction(
         source, db.get(), batch.m_texts.data(), count, error, step,
         [&] {
@@ -355,9 +366,17 @@ int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch
         [&] {
             changes = sqlite3_total_changes(db.get()) - before;
             return SQLITE_OK;
+        },
+        [&](int at) {
+            // An ignored row changes nothing, and then the last row id is
+            // another statement's.
+            if (ids.size() < batch.m_inserts.size() && batch.m_inserts[ids.size()] == at) {
+                ids.push_back(sqlite3_changes(db.get()) > 0 ? sqlite3_last_insert_rowid(db.get()) : -1);
+            }
         });
     if (rc == SQLITE_OK) {
         batch.m_changes = changes;
+        batch.m_rowIds = std::move(ids);
         DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "ExecuteBatch SUCCESS[%d]: %d statements", rc,
                      count);
         return rc;
@@ -452,9 +471,10 @@ int DAOperations::GetVersion(DAConnectionSource& source, DABasePath& location, i
     return rc;
 }
 
-int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int version)
+int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int version, bool& applied)
 {
     const char* const func = "Migrate";
+    applied = false;
     if (version <= 0) {
         DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(),
                      "Migrate FAILED[%d]: step for version %d, versions start at 1", SQLITE_MISUSE, version);
@@ -490,6 +510,7 @@ int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int 
             },
             [&] { return ExecWhileBusy(source, db.get(), setVersion.c_str(), error); });
         if (rc == SQLITE_OK) {
+            applied = true;
             DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "Migrate SUCCESS[%d]: version %d", rc, version);
             return rc;
         }

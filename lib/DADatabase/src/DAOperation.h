@@ -125,7 +125,7 @@ struct DAOperations {
     static int CreateIndex(DAConnectionSource& source, DACreateIndexRequest& request);
     static int AddColumn(DAConnectionSource& source, DAAddColumnRequest& request);
     static int GetVersion(DAConnectionSource& source, DABasePath& location, int& version);
-    static int Migrate(DAConnectionSource& source, DABatchRequest& step, int version);
+    static int Migrate(DAConnectionSource& source, DABatchRequest& step, int version, bool& applied);
     static int GetSpace(DAConnectionSource& source, DABasePath& location, std::int64_t& fileBytes,
                         std::int64_t& freeBytes);
     static int Compact(DAConnectionSource& source, DABasePath& location);

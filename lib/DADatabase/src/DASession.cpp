@@ -46,6 +46,7 @@ struct DASessionState {
     mutable std::shared_mutex life;
     bool wal = true;
     bool sync = true;
+    bool create = true;
     std::int64_t sizeLimit = 0;
 
     DABasePath location;
@@ -368,6 +369,12 @@ void DASession::SetSyncOnCommit(bool sync)
     m_state->sync = sync;
 }
 
+void DASession::SetCreate(bool create)
+{
+    const std::unique_lock<std::shared_mutex> life(m_state->life);
+    m_state->create = create;
+}
+
 void DASession::SetSizeLimit(std::int64_t bytes)
 {
     const std::unique_lock<std::shared_mutex> life(m_state->life);
@@ -390,7 +397,8 @@ int DASession::Open(DABasePath& location)
 
     DASessionSource source(state, __LINE__);
     DAConnection writer;
-    int rc = source.OpenConnection(state.path, kWriterFlags, func, writer);
+    int rc = source.OpenConnection(state.path, state.create ? kWriterFlags : kWriterFlags & ~SQLITE_OPEN_CREATE, func,
+                                   writer);
     if (rc != SQLITE_OK) {
         return rc;
     }
@@ -550,7 +558,14 @@ int DASession::GetVersion(int& version)
 int DASession::Migrate(DABatchRequest& step, int version)
 {
     DASessionCall source(*m_state, __LINE__);
-    return DAOperations::Migrate(source, step, version);
+    bool applied = false;
+    return DAOperations::Migrate(source, step, version, applied);
+}
+
+int DASession::Migrate(DABatchRequest& step, int version, bool& applied)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::Migrate(source, step, version, applied);
 }
 
 int DASession::GetSpace(std::int64_t& fileBytes, std::int64_t& freeBytes)
