@@ -166,6 +166,10 @@ public:
     int Delete(DADeleteRequest& request, int& changes);
     ///@}
 
+    /// DADatabase::Unwatch at the session's file: codes and lines as stated
+    /// there.
+    int Unwatch(char const* table);
+
 private:
     std::unique_ptr<DASessionState> m_state;
 };

@@ -536,3 +536,10 @@ int DASession::Delete(DADeleteRequest& request, int& changes)
     DASessionCall source(*m_state, __LINE__);
     return DAOperations::Delete(source, request, changes);
 }
+
+int DASession::Unwatch(char const* table)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    return DAOperations::Unwatch(source, here, table);
+}
