@@ -519,9 +519,10 @@ int DAOperations::Watch(DAConnectionSource& source, DABasePath& location, char c
                 "(name TEXT PRIMARY KEY COLLATE NOCASE, changes INTEGER NOT NULL) WITHOUT ROWID");
     AddText(texts, "INSERT OR IGNORE INTO " + counters + " VALUES(" + name + ", 0)");
     for (const char* event : kDAWatchEvents) {
-        AddText(texts,
-                "CREATE TRIGGER IF NOT EXISTS \"" + DAWatchTrigger(table, event) + "\" AFTER " + event + " ON " +
-                    table + " BEGIN UPDATE " + counters + " SET changes = changes + 1 WHERE name = " + name + "; END");
+        std::string trigger = "CREATE TRIGGER IF NOT EXISTS \"" + DAWatchTrigger(table, event);
+        trigger.append("\" AFTER ").append(event).append(" ON ").append(table);
+        trigger.append(" BEGIN UPDATE ").append(counters).append(" SET changes = changes + 1 WHERE name = ");
+        AddText(texts, trigger.append(name).append("; END"));
     }
     const std::string read =
         "SELECT changes, (SELECT schema_version FROM pragma_schema_version) FROM " + counters + " WHERE name = " + name;

@@ -135,7 +135,10 @@ public:
         reader.generation = generation;
     }
 
-    bool IsRetryLimit(int& count) override { return DAIsRetryLimit(count, DA_FILE_NAME, __LINE__); }
+    // Waits for other connections in short steps (DAShortBusyWait): a held
+    // connection's write goes on within a couple of milliseconds of the
+    // other's commit, not after a 100 ms pause.
+    bool IsRetryLimit(int& count) override { return m_busy.IsRetryLimit(count, DA_FILE_NAME, __LINE__); }
 
     // The session's statements are kept by shape (DAStatementCache.h): a
     // text whose shape was seen on this connection is bound, not parsed
@@ -272,6 +275,7 @@ private:
     }
 
     DASessionState& m_state;
+    DAShortBusyWait m_busy;
     DAReader m_reader;  // the one this operation holds, if any
     std::string m_scratch[4];
     std::string m_shape;  // the shape and literals of the last text split
