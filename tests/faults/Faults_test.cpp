@@ -107,7 +107,7 @@ TEST_P(AllocFailure, FailsCleanlyAtEveryAllocationAndStaysUsable)
     RawDb(PathOf("seed.db"))
         .Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT, n REAL); CREATE TABLE d(x);"
              "INSERT INTO t VALUES (1, 'a', 1.5), (2, 'b', 2.5);"
-             "CREATE TABLE u(k INTEGER, w TEXT); INSERT INTO u VALUES (1, 'x');");
+             "CREATE TABLE u(k INTEGER, w TEXT); INSERT INTO u VALUES (1, 'x'); CREATE TABLE p(x);");
     DADatabase db;
     DACreateRequest create;
     DADropRequest drop;
@@ -127,14 +127,36 @@ TEST_P(AllocFailure, FailsCleanlyAtEveryAllocationAndStaysUsable)
     join.SetPath(Dir().c_str(), "t.db");
     join.SetLeftJoin("t", "k");
     join.SetRightJoin("u", "k");
-    // op(db) or op(session), the session opened (its failure is the result) and closed.
+    DABatchRequest batch;
+    At(batch, Dir()).Add(upsert);
+    batch.Add(remove);
+    // op(db) or op(session), the session opened (its failure is the result)
+    // and closed. However op ends, a throw included, the session then takes
+    // a write that another connection sees.
     const auto via = [&](auto&& op) {
         if (!held) {
             return op(db);
         }
         DASession session;
         const int rc = session.Open(join);
-        return rc != SQLITE_OK ? rc : op(session);
+        if (rc != SQLITE_OK) {
+            return rc;
+        }
+        struct Probe {
+            DASession& session;
+            std::string path;
+            ~Probe()
+            {
+                const int armed = std::exchange(g_failAt, 0);
+                DAUpsertRequest row;
+                row.SetTable("p");
+                row.SetData("x", "probe");
+                EXPECT_EQ(0, session.Upsert(row));
+                EXPECT_EQ("1", RawDb(path).Query("SELECT count(*) FROM p"));
+                g_failAt = armed;
+            }
+        } const probe{session, PathOf("t.db")};
+        return op(session);
     };
     const std::map<std::string, std::function<int()>> ops{
         {"CreateTable", [&] { return via([&](auto& t) { return t.CreateTable(create); }); }},
@@ -144,6 +166,8 @@ TEST_P(AllocFailure, FailsCleanlyAtEveryAllocationAndStaysUsable)
         {"Update", [&] { return via([&](auto& t) { return t.Update(update); }); }},
         {"Delete", [&] { return via([&](auto& t) { return t.Delete(remove); }); }},
         {"Upsert", [&] { return via([&](auto& t) { return t.Upsert(upsert); }); }},
+        {"ExecuteBatch", [&] { return via([&](auto& t) { return t.ExecuteBatch(batch); }); }},
+        {"Migrate", [&] { return via([&](auto& t) { return t.Migrate(batch, 1); }); }},
         {"Select", [&] { return via([&](auto& t) { return t.Select(select, cursor); }); }},
         {"JoinSelect", [&] { return via([&](auto& t) { return t.JoinSelect(join, cursor); }); }},
         {"CheckExistTable", [&] { return via([&](auto& t) { return CheckExist(t, join, "u", exists) + !exists; }); }},
@@ -500,6 +524,8 @@ TEST_F(Faults, SessionSurvivesAnIoErrorAtEveryWriteAndSync)
             DASession session;
             DABasePath location;
             const int opened = session.Open(At(location, Dir()));
+            // Open succeeds only with the log in effect.
+            EXPECT_EQ(opened == 0 ? "wal" : "delete", RawDb(PathOf("t.db")).Query("PRAGMA journal_mode")) << opened;
             DAUpsertRequest upserts[3];
             DABatchRequest batch;
             DADeleteRequest remove;

@@ -66,11 +66,21 @@ struct DASessionState;
 /// shape, the text with its quoted literals taken out; a text of a known
 /// shape has its literals bound as text (which SQLite treats as it treats
 /// the literals) instead of being parsed and planned again. Kept statements
-/// follow schema changes, the session's own and other connections'. Texts
-/// that cannot be split so (a quote or ';' in a table or column name, a
-/// schema statement) run as written; such a read, after a schema change by
-/// another connection, may fail once at its step (the parser's line; the
-/// reader is then replaced). The kept statements take some kilobytes each.
+/// follow schema changes, the session's own and other connections'; a read
+/// whose table another connection dropped fails as a per-call visit does
+/// (its code and "FAILED" line, the cursor untouched). Texts that cannot be
+/// split so (a quote or ';' in a table or column name, a schema statement)
+/// run as written. The kept statements take some kilobytes each.
+///
+/// One text differs from per-call visits: a statement kept by shape that
+/// fails at a step (an "integer overflow" of a SUM, for one) logs SQLite's
+/// own text in the parser's "SQLITE STEP ERROR!!! text" line, where a
+/// per-call visit logs the generic "SQL logic error"; codes and every other
+/// line are the same.
+///
+/// Transactions: every way out of an operation, an exception included,
+/// leaves the writer with no transaction open (a batch or migration step
+/// cut short is rolled back) and every kept statement reset.
 ///
 /// Not copyable. No exceptions of its own; Open throws std::logic_error for
 /// an incomplete location, std::bad_alloc passes through.
@@ -119,8 +129,12 @@ public:
     /// the options set. An open session is closed first. Returns 0, or the
     /// code of the step that failed with the error line "DB open failed.
     /// Error no(rc): text": 14 when the directory does not exist (nothing is
-    /// created), 26 when the file is not a database. A failed Open leaves the
-    /// session closed. Throws std::logic_error when location is incomplete.
+    /// created), 26 when the file is not a database, 10 on an I/O error
+    /// while the file is switched to the journal mode asked for. A switch
+    /// SQLite refuses without an error (a file system without shared memory
+    /// for the log) fails with 10 and "DB open failed. Error no(10): journal
+    /// mode delete, not wal". A failed Open leaves the session closed.
+    /// Throws std::logic_error when location is incomplete.
     int Open(DABasePath& location);
 
     /// Waits for the operations in progress, then closes every connection.

@@ -5,6 +5,7 @@
 
 #include "DABusyRetry.h"
 #include "DALog.h"
+#include "DAParseRows.h"
 
 namespace {
 
@@ -63,9 +64,15 @@ void DADatabaseParser::ParseDatabase(sqlite3* db, sqlite3_stmt* stmt, DACursor& 
 
 int DADatabaseParser::ParseRows(sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor, std::string& failure)
 {
+    return DAParseRows(*this, db, stmt, cursor, failure, false);
+}
+
+int DAParseRows(DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor, std::string& failure,
+                bool mayBeStale)
+{
     const char* const func = "ParseDatabase";
-    cursor.Initialize();
-    DABusyRetry<DADatabaseParser> retry(*this);
+    DABusyRetry<DADatabaseParser> retry(parser);
+    bool first = true;  // until the first step that was not busy
     bool registered = false;
     int columnCount = 0;
     int failed = SQLITE_OK;  // the failed step's code, once known
@@ -76,6 +83,15 @@ int DADatabaseParser::ParseRows(sqlite3* db, sqlite3_stmt* stmt, DACursor& curso
     std::vector<std::string> names;
     for (;;) {
         const int rc = sqlite3_step(stmt);
+        if (first && (rc != SQLITE_BUSY || retry.Stopped())) {
+            first = false;
+            // SQLite marks a statement expired when it met a schema newer
+            // than its own and could not be prepared again against it.
+            if (mayBeStale && rc != SQLITE_ROW && rc != SQLITE_DONE && sqlite3_expired(stmt) != 0) {
+                return kDAStaleStatement;
+            }
+            cursor.Initialize();
+        }
         if (rc == SQLITE_DONE && failed == SQLITE_OK) {
             return rc;
         }

@@ -10,6 +10,7 @@
 #include "DABusyRetry.h"
 #include "DADatabaseParser.h"
 #include "DALog.h"
+#include "DAParseRows.h"
 #include "DAPlainName.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
@@ -81,10 +82,13 @@ int RunWrite(DAConnectionSource& source, Request& request, void (DASqlGenerator:
 }
 
 // The query frame: acquire for reading, generate, prepare under busy-retry,
-// and on success return parse(parser, db, stmt); on failure log "<word>
-// FAILED[rc]: text" under func and return the preparation's code. When no
-// connection can be had, logs "OpenDB Error: rc" (info) if logOpenFailure
-// and returns that code.
+// and on success return parse(parser, db, stmt, mayBeStale); on failure log
+// "<word> FAILED[rc]: text" under func and return the preparation's code.
+// A statement the source kept from before a schema change it cannot follow
+// (parse gave kDAStaleStatement) is prepared again from the text, so that
+// the operation ends as on a fresh connection. When no connection can be
+// had, logs "OpenDB Error: rc" (info) if logOpenFailure and returns that
+// code.
 template <typename Generate, typename Parse>
 int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate, Parse parse, const char* func,
              const char* word, bool logOpenFailure)
@@ -101,14 +105,22 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
     generate(sql);
 
     DAStatementLease stmt;
-    const int rc = source.Prepare(db.get(), sql.c_str(), stmt);
-    if (rc != SQLITE_OK) {
-        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
-                     sqlite3_errmsg(db.get()));
-        return rc;
-    }
     DADatabaseParser parser;
-    return parse(parser, db.get(), stmt.get());
+    int rc = source.Prepare(db.get(), sql.c_str(), stmt);
+    if (rc == SQLITE_OK) {
+        rc = parse(parser, db.get(), stmt.get(), source.MayBeStale());
+        if (rc != kDAStaleStatement) {
+            return rc;
+        }
+        stmt.reset();
+        rc = source.DAConnectionSource::Prepare(db.get(), sql.c_str(), stmt);
+        if (rc == SQLITE_OK) {
+            return parse(parser, db.get(), stmt.get(), false);
+        }
+    }
+    DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
+                 sqlite3_errmsg(db.get()));
+    return rc;
 }
 
 // A query whose rows fill cursor; step failures are logged by the parser,
@@ -121,18 +133,16 @@ int RunCursorQuery(DAConnectionSource& source, Request& request,
 {
     return RunQuery(
         source, request, [&](std::string& sql) { (DASqlGenerator().*generate)(request, sql); },
-        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt) {
-            if (!returnStepFailure) {
-                parser.ParseDatabase(db, stmt, cursor);
-                return SQLITE_OK;
-            }
+        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, bool mayBeStale) {
             std::string failure;
-            const int rc = parser.ParseRows(db, stmt, cursor, failure);
-            if (rc == SQLITE_DONE) {
+            const int rc = DAParseRows(parser, db, stmt, cursor, failure, mayBeStale);
+            if (rc == SQLITE_DONE || (rc != kDAStaleStatement && !returnStepFailure)) {
                 return SQLITE_OK;
             }
-            DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
-                         failure.c_str());
+            if (rc != kDAStaleStatement) {
+                DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", word, rc,
+                             failure.c_str());
+            }
             return rc;
         },
         func, word, logOpenFailure);
@@ -146,10 +156,32 @@ int RunCursorQuery(DAConnectionSource& source, Request& request,
 // with step where it stopped (0 the begin or decide, 1..count the
 // statements, count + 1 finish or the commit) and error the text of a
 // failed exec.
+// Rolls back whatever transaction db still has open when it goes out of
+// scope: a failure, a stop, or an exception (std::bad_alloc) passing
+// through. A held connection must never carry a transaction into its next
+// operation, whose acknowledged write would then be lost with it.
+class DARollbackGuard {
+public:
+    explicit DARollbackGuard(sqlite3* db) : m_db(db) {}
+    ~DARollbackGuard()
+    {
+        // Some failures end the transaction inside SQLite already.
+        if (sqlite3_get_autocommit(m_db) == 0) {
+            sqlite3_exec(m_db, "ROLLBACK", nullptr, nullptr, nullptr);
+        }
+    }
+    DARollbackGuard(const DARollbackGuard&) = delete;
+    DARollbackGuard& operator=(const DARollbackGuard&) = delete;
+
+private:
+    sqlite3* m_db;
+};
+
 template <typename Decide, typename Finish>
 int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, int count, DAErrorText& error, int& step,
                    Decide decide, Finish finish)
 {
+    const DARollbackGuard rollback(db);
     // IMMEDIATE takes the write lock now, so a busy file shows (and is
     // waited for) before any statement runs.
     step = 0;
@@ -169,10 +201,6 @@ int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, i
     }
     if (rc == SQLITE_OK) {
         rc = ExecWhileBusy(source, db, "COMMIT", error);
-    }
-    // Some failures end the transaction inside SQLite already.
-    if (rc != SQLITE_OK && sqlite3_get_autocommit(db) == 0) {
-        sqlite3_exec(db, "ROLLBACK", nullptr, nullptr, nullptr);
     }
     return rc;
 }
@@ -379,7 +407,7 @@ int DAOperations::CheckExistTable(DAConnectionSource& source, DABasePath& locati
             }
             DASqlGenerator().GetCheckTableSql(tableName, sql);
         },
-        [&](DADatabaseParser& parser, sqlite3* /*db*/, sqlite3_stmt* stmt) {
+        [&](DADatabaseParser& parser, sqlite3* /*db*/, sqlite3_stmt* stmt, bool /*mayBeStale*/) {
             parser.ParseExistTable(stmt, exists);
             return SQLITE_OK;
         },

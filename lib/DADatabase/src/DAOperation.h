@@ -91,6 +91,11 @@ public:
     // Ends a statement Prepare handed out; here it is finalized.
     virtual void Finish(sqlite3_stmt* stmt) noexcept;
 
+    // Whether a statement Prepare hands out may have been prepared against
+    // a schema that another connection has changed since: not here, where
+    // every connection is new; on a held connection, yes.
+    virtual bool MayBeStale() const { return false; }
+
 private:
     const char* m_file;
     int m_line;

@@ -140,6 +140,9 @@ public:
     // other's commit, not after a 100 ms pause.
     bool IsRetryLimit(int& count) override { return m_busy.IsRetryLimit(count, DA_FILE_NAME, __LINE__); }
 
+    // Held connections outlive other connections' schema changes.
+    bool MayBeStale() const override { return true; }
+
     // The session's statements are kept by shape (DAStatementCache.h): a
     // text whose shape was seen on this connection is bound, not parsed
     // and planned again. Any other text is prepared as it is.
@@ -227,7 +230,9 @@ public:
         if (rc == SQLITE_ROW) {
             const auto* text = reinterpret_cast<const char*>(sqlite3_column_text(stmt.get(), 0));
             value = text != nullptr ? text : "";
-            rc = SQLITE_OK;
+            // The statement's own transaction (a journal mode switch writes
+            // the file's header) commits at its last step, which can fail.
+            rc = DARetryWhileBusy(*this, [&] { return sqlite3_step(stmt.get()); });
         }
         return rc == SQLITE_DONE ? SQLITE_OK : rc;
     }
@@ -391,6 +396,14 @@ int DASession::Open(DABasePath& location)
             rc = source.Pragma(writer.get(),
                                "PRAGMA journal_size_limit=" + std::to_string(state.checkpointPages * page), ignored);
         }
+    }
+    const char* const wanted = state.wal ? "wal" : "delete";
+    if (rc == SQLITE_OK && mode != wanted) {
+        // SQLite answers a switch it cannot make at all (a file system
+        // without shared memory) with the mode it kept, not with an error.
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(),
+                     "DB open failed. Error no(%d): journal mode %s, not %s", SQLITE_IOERR, mode.c_str(), wanted);
+        return SQLITE_IOERR;
     }
     if (rc != SQLITE_OK) {
         return source.OpenFailed(rc, writer, func);
