@@ -13,6 +13,7 @@
 #include <gtest/gtest.h>
 
 #include "DADatabase.h"
+#include "DAWatch.h"
 #include "DatabaseTestUtil.h"
 #include "TempDirTest.h"
 
@@ -194,6 +195,16 @@ const OperationCase kOperations[] = {
          RawDb(dir + "/t.db").Run("DROP TABLE groups");
          rc = rc * 10 + RUN(t, Select, select, cursor);
          return rc * 10 + RUN(t, Query, query, cursor) + RUN(t, Select, select, cursor);
+     }},
+    {"unwatch",  // removes the triggers and counters a watch installed; refuses a name that is not plain
+     [](Target& t, const std::string& dir, DACursor&) {
+         DAWatch watch;
+         DABasePath at;
+         const int rc = watch.Open(At(at, dir)) + watch.AddTable("contacts");
+         watch.Close();
+         return rc * 100 +
+             (t.session != nullptr ? t.session->Unwatch("contacts") * 10 + t.session->Unwatch("a b")
+                                   : t.db->Unwatch(at, "contacts") * 10 + t.db->Unwatch(at, "a b"));
      }},
     {"batch",
      [](Target& t, const std::string& dir, DACursor&) {

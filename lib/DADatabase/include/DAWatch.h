@@ -32,8 +32,9 @@ struct DAWatchState;
 /// while nothing is written the process does not wake. A wake-up can come
 /// early (before a commit is visible) or for nothing (a write to another
 /// table, a checkpoint): Check then first waits for the commit in progress
-/// to end (as a session waits out a lock: within 1-2 ms of its end, 5
-/// after 1.5 s), then compares the counters with the ones it last saw, so
+/// to end (as a session waits out a lock: within 1-2 ms of its end, the
+/// limit line and 5 after 1.5 s; no warning, as this wait is the normal
+/// case), then compares the counters with the ones it last saw, so
 /// a change is never lost and a change-less wake-up reports nothing.
 ///
 /// A watched table that is dropped (its triggers go with it) is reported

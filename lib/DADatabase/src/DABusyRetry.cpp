@@ -28,6 +28,8 @@ bool DAShortBusyWait::IsRetryLimit(int& count, const char* file, int line)
     const auto now = std::chrono::steady_clock::now();
     if (count == 0) {
         m_since = now;
+    }
+    if (count == 0 && !m_quiet) {
         DA_LOG_WHERE(DLOG_WARN, file, "IsRetryLimit", line, "SQLITE BUSY[%d]", 1);
     }
     ++count;

@@ -20,12 +20,16 @@ bool DAIsRetryLimit(int& count, const char* file, int line);
 // times 100 ms) has passed since the wait began, and then logs the limit
 // line (error) and returns true, as DAIsRetryLimit does after its 15th
 // pause. One object serves the loops of one thread, one after another.
+// Quiet, it leaves out the warning: for a wait that is an expected part of
+// the work (a watch waiting for the commit that woke it).
 class DAShortBusyWait {
 public:
     bool IsRetryLimit(int& count, const char* file, int line);
+    void SetQuiet(bool quiet) { m_quiet = quiet; }
 
 private:
     std::chrono::steady_clock::time_point m_since;
+    bool m_quiet = false;
 };
 
 // The state of one busy-retry loop: its counter and its stop flag. Owner is

@@ -235,7 +235,10 @@ int Inspect(DAWatchState& state, const char* func, int line, std::vector<std::st
         // The wake-up may precede the commit's publication (a log's last
         // write comes before its index is updated): the write lock, had for
         // an instant, is had only once that commit has ended.
+        // Waiting for it is the normal case, not contention: no warning.
+        state.busy.SetQuiet(true);
         rc = source.Execute(state.db.get(), "BEGIN IMMEDIATE", error);
+        state.busy.SetQuiet(false);
         if (rc == SQLITE_OK) {
             sqlite3_exec(state.db.get(), "COMMIT", nullptr, nullptr, nullptr);
         }
