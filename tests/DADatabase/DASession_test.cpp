@@ -4,13 +4,16 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <functional>
 #include <regex>
 #include <string>
+#include <thread>
 
 #include <gtest/gtest.h>
 
 #include "DADatabase.h"
+#include "DAWatch.h"
 #include "DatabaseTestUtil.h"
 #include "TempDirTest.h"
 
@@ -231,6 +234,16 @@ const OperationCase kOperations[] = {
          cursor.SetColumn("state");
          cursor.SetData("state", state.c_str());
          return rc;
+     }},
+    {"unwatch",  // removes the triggers and counters a watch installed; refuses a name that is not plain
+     [](Target& t, const std::string& dir, DACursor&) {
+         DAWatch watch;
+         DABasePath at;
+         const int rc = watch.Open(At(at, dir)) + watch.AddTable("contacts");
+         watch.Close();
+         return rc * 100 +
+             (t.session != nullptr ? t.session->Unwatch("contacts") * 10 + t.session->Unwatch("a b")
+                                   : t.db->Unwatch(at, "contacts") * 10 + t.db->Unwatch(at, "a b"));
      }},
     {"batch",
      [](Target& t, const std::string& dir, DACursor&) {
@@ -523,6 +536,46 @@ TEST_F(SessionTest, DescriptorsStayConstant)
     EXPECT_EQ(descriptors, OpenDescriptorCount());
     session.Close();
     EXPECT_EQ(closed, OpenDescriptorCount());
+}
+
+// Another connection's write lock: the session's write goes on within 25 ms
+// of its release with one warning; held past 1.5 s, the write gives up with
+// 5 and the limit line.
+TEST_F(SessionTest, WaitsForAnotherConnectionInShortSteps)
+{
+    const std::string dir = Seeded("db");
+    DASession session;
+    ASSERT_EQ(0, OpenAt(session, dir));
+    RawDb holder(dir + "/t.db");
+    DAUpsertRequest upsert;
+    At(upsert, dir, "groups").SetData("title", "Club");
+    const auto line = [](int priority, const char* function, const std::string& message) {
+        return Logged(priority, "DASession.cpp", function, message);
+    };
+    for (const int holdMs : {200, 1700}) {
+        holder.Run("BEGIN EXCLUSIVE");
+        std::chrono::steady_clock::time_point released;
+        std::thread release([&] {
+            std::this_thread::sleep_for(std::chrono::milliseconds(holdMs));
+            holder.Run("COMMIT");
+            released = std::chrono::steady_clock::now();
+        });
+        LogCapture log;
+        const int rc = session.Upsert(upsert);
+        const auto done = std::chrono::steady_clock::now();
+        release.join();
+        Strings expected{line(5, "IsRetryLimit", "SQLITE BUSY[1]")};
+        if (holdMs < 1000) {
+            EXPECT_EQ(0, rc);
+            EXPECT_LT(done - released, std::chrono::milliseconds(25));
+            expected.push_back(line(4, "Upsert", "Upsert SUCCESS[0]"));
+        } else {
+            EXPECT_EQ(5, rc);
+            expected.push_back(line(6, "IsRetryLimit", "RETRY COUNT is reached LIMIT, SQLITE_BUSY"));
+            expected.push_back(line(6, "Upsert", "Upsert FAILED[5]: database is locked"));
+        }
+        EXPECT_EQ(expected, Described(log));
+    }
 }
 
 // A failure at the step of a statement kept by shape logs SQLite's own text

@@ -201,6 +201,17 @@ public:
     int Update(DAUpdateRequest& request, int& changes);
     int Delete(DADeleteRequest& request, int& changes);
     ///@}
+
+    /// Removes from location's file what watching table left there (see
+    /// DAWatch.h): its three triggers and its counter, and the counter table
+    /// with the last counter, in one transaction under the write lock (the
+    /// busy-retry rule). A table never watched leaves the file unchanged.
+    /// Every DAWatch of that table, in any process, reports it once more at
+    /// its next Check and then no longer watches it. Returns 0 with the line
+    /// "Unwatch SUCCESS[0]", or the code with "Unwatch FAILED[rc]: text"; a
+    /// null or non-plain table name returns 21 with the one line "Unwatch
+    /// FAILED[21]: table name is not a plain name", nothing opened.
+    int Unwatch(DABasePath& location, char const* table);
 };
 
 #endif  // DADATABASE_H

@@ -5,8 +5,7 @@
 #include <string>
 #include <vector>
 
-/// The type a value of a result has, as SQLite stored it.
-enum class DAValueType { Null, Integer, Real, Text, Blob };
+#include "DAValue.h"  // DAValueType: the type a value of a result has, as SQLite stored it
 
 struct DATypedStore;
 

@@ -50,11 +50,16 @@ struct DASessionState;
 /// the setters wait for the operations in progress and hold off new ones.
 ///
 /// Between a session and other connections (per-call visits of DADatabase,
-/// other sessions, other processes) the busy-retry rule of DADatabase holds
-/// unchanged; no busy handler is set. Its own readers never make a read
-/// wait; rarely, a reader that meets the log's index being rewritten holds
-/// the write lock for an instant, and a write starting then pauses once
-/// under that rule. Per-call visits of a file a session holds with
+/// other sessions, other processes) a session waits in short steps: an
+/// operation that meets another connection's lock logs one warning "SQLITE
+/// BUSY[1]" when the wait begins and retries every millisecond, so it goes
+/// on within a few milliseconds of the lock's release; after the busy-retry
+/// rule's whole pause (1.5 s) it logs "RETRY COUNT is reached LIMIT,
+/// SQLITE_BUSY", makes one last attempt and returns its code (5 if still
+/// busy), as DADatabase does. No busy handler is set. Its own readers never
+/// make a read wait; rarely, a reader that meets the log's index being
+/// rewritten holds the write lock for an instant, and a write starting then
+/// waits that instant. Per-call visits of a file a session holds with
 /// the log see every committed row. Close checkpoints the log into the file
 /// and removes it when no other connection has the file open (else the last
 /// one to close does); the file stays in WAL mode, which any SQLite program
@@ -200,6 +205,10 @@ public:
     int Update(DAUpdateRequest& request, int& changes);
     int Delete(DADeleteRequest& request, int& changes);
     ///@}
+
+    /// DADatabase::Unwatch at the session's file: codes and lines as stated
+    /// there.
+    int Unwatch(char const* table);
 
 private:
     std::unique_ptr<DASessionState> m_state;

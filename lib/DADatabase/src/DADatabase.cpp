@@ -194,3 +194,9 @@ int DADatabase::Delete(DADeleteRequest& request, int& changes)
     DAVisit visit(*this, __LINE__);
     return DAOperations::Delete(visit, request, changes);
 }
+
+int DADatabase::Unwatch(DABasePath& location, char const* table)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Unwatch(visit, location, table);
+}

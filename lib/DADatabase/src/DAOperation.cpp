@@ -12,10 +12,12 @@
 #include "DADatabaseParser.h"
 #include "DALog.h"
 #include "DAParseRows.h"
+#include "DAPlainName.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
 #include "DAStepRows.h"
 #include "DATypedStore.h"
+#include "DAWatchSchema.h"
 
 void DALeaseEnd::operator()(sqlite3* db) const noexcept
 {
@@ -290,6 +292,51 @@ int RunRead(DAConnectionSource& source, DABasePath& location, const char* sql, s
 }
 
 const char* const kReadVersion = "PRAGMA user_version";
+
+// Refuses a table name that is not plain, with the line "<func>
+// FAILED[21]: table name is not a plain name".
+bool IsWatchableName(DAConnectionSource& source, char const* table, const char* func)
+{
+    if (DAIsPlainName(table)) {
+        return true;
+    }
+    DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: table name is not a plain name", func,
+                 SQLITE_MISUSE);
+    return false;
+}
+
+// Appends sql and its terminating NUL to texts (the form RunTransaction
+// takes).
+void AddText(std::string& texts, const std::string& sql)
+{
+    texts += sql;
+    texts += '\0';
+}
+
+// A transaction of count texts with finish, logged "<func> SUCCESS[0]" or
+// "<func> FAILED[rc]: text" under func.
+template <typename Finish>
+int RunWatchTransaction(DAConnectionSource& source, DABasePath& location, const char* func, const std::string& texts,
+                        int count, Finish finish)
+{
+    DALease db;
+    int rc = source.Acquire(location, DAAccess::Write, func, db);
+    if (rc != SQLITE_OK) {
+        return rc;
+    }
+    DAErrorText error;
+    int step = 0;
+    rc = RunTransaction(
+        source, db.get(), texts.data(), count, error, step, [] { return SQLITE_OK; },
+        [&] { return finish(db.get(), error); });
+    if (rc == SQLITE_OK) {
+        DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "%s SUCCESS[%d]", func, rc);
+    } else {
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", func, rc,
+                     FailureText(error, rc));
+    }
+    return rc;
+}
 
 }  // namespace
 
@@ -568,4 +615,68 @@ int DAOperations::Delete(DAConnectionSource& source, DADeleteRequest& request, i
 {
     return RunWrite(source, request, &DASqlGenerator::GetDeleteSql, "Delete", "delete",
                     [&](sqlite3* db) { changes = sqlite3_changes(db); });
+}
+
+int DAOperations::Watch(DAConnectionSource& source, DABasePath& location, char const* table, std::int64_t& changes,
+                        std::int64_t& schema)
+{
+    const char* const func = "AddTable";
+    if (!IsWatchableName(source, table, func)) {
+        return SQLITE_MISUSE;
+    }
+    // Names are plain, so they need no quoting inside the literals.
+    const std::string counters = std::string("\"") + kDAWatchTable + "\"";
+    const std::string name = std::string("'") + table + "'";
+    std::string texts;
+    AddText(texts,
+            "CREATE TABLE IF NOT EXISTS " + counters +
+                "(name TEXT PRIMARY KEY COLLATE NOCASE, changes INTEGER NOT NULL) WITHOUT ROWID");
+    AddText(texts, "INSERT OR IGNORE INTO " + counters + " VALUES(" + name + ", 0)");
+    for (const char* event : kDAWatchEvents) {
+        std::string trigger = "CREATE TRIGGER IF NOT EXISTS \"" + DAWatchTrigger(table, event);
+        trigger.append("\" AFTER ").append(event).append(" ON ").append(table);
+        trigger.append(" BEGIN UPDATE ").append(counters).append(" SET changes = changes + 1 WHERE name = ");
+        AddText(texts, trigger.append(name).append("; END"));
+    }
+    const std::string read =
+        "SELECT changes, (SELECT schema_version FROM pragma_schema_version) FROM " + counters + " WHERE name = " + name;
+    std::array<std::int64_t, 2> values{};
+    const int rc = RunWatchTransaction(source, location, func, texts, 5, [&](sqlite3* db, DAErrorText& error) {
+        return ReadIntegers(source, db, read.c_str(), values, error);
+    });
+    if (rc == SQLITE_OK) {
+        changes = values[0];
+        schema = values[1];
+    }
+    return rc;
+}
+
+int DAOperations::Unwatch(DAConnectionSource& source, DABasePath& location, char const* table)
+{
+    const char* const func = "Unwatch";
+    if (!IsWatchableName(source, table, func)) {
+        return SQLITE_MISUSE;
+    }
+    const std::string counters = std::string("\"") + kDAWatchTable + "\"";
+    std::string texts;
+    for (const char* event : kDAWatchEvents) {
+        AddText(texts, "DROP TRIGGER IF EXISTS \"" + DAWatchTrigger(table, event) + "\"");
+    }
+    const std::string present =
+        std::string("SELECT count(*) FROM sqlite_master WHERE type = 'table' AND name = '") + kDAWatchTable + "'";
+    const std::string forget = "DELETE FROM " + counters + " WHERE name = '" + table + "'";
+    const std::string left = "SELECT count(*) FROM " + counters;
+    const std::string drop = "DROP TABLE " + counters;
+    return RunWatchTransaction(source, location, func, texts, 3, [&](sqlite3* db, DAErrorText& error) {
+        std::array<std::int64_t, 1> count{};
+        int rc = ReadIntegers(source, db, present.c_str(), count, error);
+        if (rc != SQLITE_OK || count[0] == 0) {
+            return rc;
+        }
+        rc = ExecWhileBusy(source, db, forget.c_str(), error);
+        if (rc == SQLITE_OK) {
+            rc = ReadIntegers(source, db, left.c_str(), count, error);
+        }
+        return rc == SQLITE_OK && count[0] == 0 ? ExecWhileBusy(source, db, drop.c_str(), error) : rc;
+    });
 }

@@ -132,6 +132,17 @@ struct DAOperations {
     static int Insert(DAConnectionSource& source, DAInsertRequest& request, std::int64_t& rowId);
     static int Update(DAConnectionSource& source, DAUpdateRequest& request, int& changes);
     static int Delete(DAConnectionSource& source, DADeleteRequest& request, int& changes);
+
+    // Installs, under the write lock, what watching table needs in the file
+    // (DAWatchSchema.h; kept if there): 0 with changes and schema the
+    // table's counter and the file's schema version at that commit, else
+    // the code. Lines "AddTable SUCCESS[0]" / "AddTable FAILED[rc]: text";
+    // a name that is not plain is refused with 21 and one line.
+    static int Watch(DAConnectionSource& source, DABasePath& location, char const* table, std::int64_t& changes,
+                     std::int64_t& schema);
+    // Removes table's triggers and counter, and the counter table with the
+    // last counter: contract in DADatabase.h (Unwatch).
+    static int Unwatch(DAConnectionSource& source, DABasePath& location, char const* table);
 };
 
 #endif  // DAOPERATION_H

@@ -147,7 +147,10 @@ public:
         reader.generation = generation;
     }
 
-    bool IsRetryLimit(int& count) override { return DAIsRetryLimit(count, DA_FILE_NAME, __LINE__); }
+    // Waits for other connections in short steps (DAShortBusyWait): a held
+    // connection's write goes on within a couple of milliseconds of the
+    // other's commit, not after a 100 ms pause.
+    bool IsRetryLimit(int& count) override { return m_busy.IsRetryLimit(count, DA_FILE_NAME, __LINE__); }
 
     // Held connections outlive other connections' schema changes.
     bool MayBeStale() const override { return true; }
@@ -303,6 +306,7 @@ private:
     }
 
     DASessionState& m_state;
+    DAShortBusyWait m_busy;
     DAReader m_reader;  // the one this operation holds, if any
     std::string m_scratch[4];
     std::string m_shape;  // the shape and literals of the last text split
@@ -600,4 +604,11 @@ int DASession::Delete(DADeleteRequest& request, int& changes)
 {
     DASessionCall source(*m_state, __LINE__);
     return DAOperations::Delete(source, request, changes);
+}
+
+int DASession::Unwatch(char const* table)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    return DAOperations::Unwatch(source, here, table);
 }
