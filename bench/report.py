@@ -18,7 +18,7 @@ LOCATIONS = ("tmpfs", "disk", "memory")
 SECTIONS = [("Write operations", ["write"]), ("Batches", ["batch"]), ("Queries", ["select", "join", "page", "exist"]),
             ("Reading a cursor", ["walk"]), ("Names", ["lock", "intern", "memory"]), ("Conditions", ["cond"]),
             ("Schema", ["schema"]), ("Sessions", ["session"]),
-            ("Typed reads", ["typed"])]
+            ("Typed reads", ["typed"]), ("Watching", ["watch"])]
 
 
 def ratio(a, b, metric="real", per=None):
@@ -95,6 +95,15 @@ TARGETS = [
     one("session `Query` by key into `DATypedCursor`, tmpfs: lib / raw", "typed/bykey/tmpfs/lib", "raw", "<=", 1.3),
     one("1 MiB blob written and read per call, tmpfs: lib / raw", "typed/blob1MiB/tmpfs/lib", "raw", "<=", 2),
     one("batch of 500 inserts, unsynced session, tmpfs: lib / raw", "typed/batch500/tmpfs/lib", "raw", "<=", 1.2),
+    *[(f"commit → `Wait` in another process, {w}, tmpfs: {q} (ms)", of(f"watch/latency/tmpfs/{w}", f"{q}_ms", 1),
+       "<=", b) for w in ("percall", "session") for q, b in (("median", 2), ("p95", 10))],
+    ("idle watcher, 10 s: wake-ups", of("watch/idle/tmpfs/lib", "wakeups", 1), "<=", 0),
+    one("`Upsert` per call, disk: watched / unwatched", "watch/write/disk/watched", "unwatched", "<=", 1.1),
+    one("`Upsert` unsynced session, tmpfs: watched / unwatched", "watch/sessionwrite/tmpfs/watched", "unwatched",
+        "<=", 1.3),
+    ("`Check` after a wake-up, 10 watched tables (µs)", of("watch/check10/tmpfs/lib", "real", 1), "<=", 50),
+    ("session write meeting another process's 20 ms write (ms)", of("watch/busy/tmpfs/session", "real", 1e3), "<=",
+     25),
     ("session held (KiB beyond the page cache)", of("session/Select/tmpfs/lib", "held_bytes", 1024), "<=", 1024),
 ]
 
@@ -104,7 +113,7 @@ def load(path):
     data, samples = json.load(open(path)), defaultdict(list)
     for run in data["benchmarks"]:
         if run.get("run_type") == "iteration" and not run.get("error_occurred"):
-            sample = {k: v for k, v in run.items() if k in ("rows", "statements") or k.endswith("_bytes")}
+            sample = {k: v for k, v in run.items() if k in ("rows", "statements", "wakeups") or k.endswith(("_bytes", "_ms"))}
             sample["real"] = run["real_time"] * {"ns": 1e-3, "us": 1.0, "ms": 1e3, "s": 1e6}[run["time_unit"]]
             samples["/".join(run["run_name"].split("/")[:4])].append(sample)
     return data.get("context", {}), samples
