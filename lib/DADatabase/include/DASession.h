@@ -15,6 +15,8 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DASearchIndexRequest.h"
+#include "DASearchRequest.h"
 #include "DASelectRequest.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
@@ -178,6 +180,14 @@ public:
     int Insert(DAInsertRequest& request, std::int64_t& rowId);
     int Update(DAUpdateRequest& request, int& changes);
     int Delete(DADeleteRequest& request, int& changes);
+    ///@}
+
+    ///@{
+    /// DADatabase's search operations, at the session's file: codes and
+    /// lines as stated in DADatabase.h. Search is a read.
+    int CreateSearchIndex(DASearchIndexRequest& request);
+    int DropSearchIndex(char const* name);
+    int Search(DASearchRequest& request, DACursor& cursor);
     ///@}
 
 private:

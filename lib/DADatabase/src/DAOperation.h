@@ -23,6 +23,8 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DASearchIndexRequest.h"
+#include "DASearchRequest.h"
 #include "DASelectRequest.h"
 #include "DASqliteHandles.h"
 #include "DAUpdateRequest.h"
@@ -126,6 +128,9 @@ struct DAOperations {
     static int Insert(DAConnectionSource& source, DAInsertRequest& request, std::int64_t& rowId);
     static int Update(DAConnectionSource& source, DAUpdateRequest& request, int& changes);
     static int Delete(DAConnectionSource& source, DADeleteRequest& request, int& changes);
+    static int CreateSearchIndex(DAConnectionSource& source, DASearchIndexRequest& request);
+    static int DropSearchIndex(DAConnectionSource& source, DABasePath& location, char const* name);
+    static int Search(DAConnectionSource& source, DASearchRequest& request, DACursor& cursor);
 };
 
 #endif  // DAOPERATION_H

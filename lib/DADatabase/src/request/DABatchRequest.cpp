@@ -82,3 +82,8 @@ int DABatchRequest::Add(DAInsertRequest& request)
 {
     return AddStatement(request, &DASqlGenerator::GetInsertSql);
 }
+
+int DABatchRequest::Add(DASearchIndexRequest& request)
+{
+    return AddStatement(request, &DASqlGenerator::GetCreateSearchIndexSql);
+}
