@@ -97,7 +97,7 @@ void Fill(DAAddColumnRequest& request, const SqlCase& c)
     }
 }
 
-// first: the index's name and "Substrings" or ""; second: the columns.
+// first: the index's name; second: the columns.
 void Fill(DASearchIndexRequest& request, const SqlCase& c)
 {
     request.SetTable(c.table);
@@ -138,13 +138,6 @@ std::string Check(const SqlCase& c)
     return out;
 }
 
-std::string DropSearch(const SqlCase& c)
-{
-    std::string out = "stale text that must disappear";
-    DASqlGenerator().GetDropSearchIndexSql(c.table, out);
-    return out;
-}
-
 const Kind kPath = Path;
 const Kind kCheck = Check;
 const Kind kDrop = Generated<DADropRequest, &DASqlGenerator::GetDropTableSql>;
@@ -160,7 +153,6 @@ const Kind kCompact = Generated<DABasePath, &DASqlGenerator::GetCompactSql>;
 const Kind kQuery = Generated<DAQueryRequest, &DASqlGenerator::GetQuerySql>;
 const Kind kInsert = Generated<DAInsertRequest, &DASqlGenerator::GetInsertSql>;
 const Kind kSearchIndex = Generated<DASearchIndexRequest, &DASqlGenerator::GetCreateSearchIndexSql>;
-const Kind kDropSearch = DropSearch;
 const Kind kSearch = Generated<DASearchRequest, &DASqlGenerator::GetSearchSql>;
 
 // Listed conditions and select lists, as the rows below use them.
@@ -281,16 +273,6 @@ const SqlCase kCases[] = {
      "OLD.a IS NOT NEW.a OR OLD.b IS NOT NEW.b BEGIN DELETE FROM ulo_search_i WHERE rowid IN (OLD.rowid, NEW.rowid); "
      "INSERT INTO ulo_search_i(rowid, a, b) VALUES (NEW.rowid, NEW.a, NEW.b); END; CREATE TRIGGER IF NOT EXISTS "
      "ulo_search_i_delete AFTER DELETE ON m BEGIN DELETE FROM ulo_search_i WHERE rowid = OLD.rowid; END"},
-    {kSearchIndex, "m", {{"i", "Substrings"}}, {{"a", ""}},
-     "CREATE VIRTUAL TABLE IF NOT EXISTS ulo_search_i USING fts5(a, tokenize='trigram'); INSERT INTO ulo_search_i("
-     "rowid, a) SELECT rowid, a FROM m WHERE rowid NOT IN (SELECT rowid FROM ulo_search_i); CREATE TRIGGER IF NOT "
-     "EXISTS ulo_search_i_insert AFTER INSERT ON m BEGIN DELETE FROM ulo_search_i WHERE rowid = NEW.rowid; INSERT INTO "
-     "ulo_search_i(rowid, a) VALUES (NEW.rowid, NEW.a); END; CREATE TRIGGER IF NOT EXISTS ulo_search_i_update AFTER "
-     "UPDATE ON m WHEN OLD.rowid IS NOT NEW.rowid OR OLD.a IS NOT NEW.a BEGIN DELETE FROM ulo_search_i WHERE rowid IN "
-     "(OLD.rowid, NEW.rowid); INSERT INTO ulo_search_i(rowid, a) VALUES (NEW.rowid, NEW.a); END; CREATE TRIGGER IF "
-     "NOT EXISTS ulo_search_i_delete AFTER DELETE ON m BEGIN DELETE FROM ulo_search_i WHERE rowid = OLD.rowid; END"},
-    {kDropSearch, "i", {}, {}, "DROP TRIGGER IF EXISTS ulo_search_i_insert; DROP TRIGGER IF EXISTS "
-     "ulo_search_i_update; DROP TRIGGER IF EXISTS ulo_search_i_delete; DROP TABLE IF EXISTS ulo_search_i"},
     {kSearch, "m", {}, {{"c", "7"}}, "SELECT m.*, ulo_hit.s FROM m JOIN (SELECT rowid AS ulo_rowid, rank AS ulo_rank, "
      "snippet(ulo_search_i, IFNULL((SELECT cid FROM pragma_table_info('ulo_search_i') WHERE name='b'), 32767), "
      "'<''', '>', '\u2026', 64) AS s FROM ulo_search_i WHERE ulo_search_i MATCH '\"Kim''s\" \"\"\"a\"\"\"*') AS ulo_hit "
@@ -302,9 +284,6 @@ const SqlCase kCases[] = {
      "'%''trigram''%' THEN '\"東京 駅\"' ELSE '\"東京\" \"駅\"' END) AS ulo_hit ON m.rowid = ulo_hit.ulo_rowid "
      "ORDER BY ts DESC", [](DABaseSet& r) { S(r).SetIndex("i"), S(r).SetText("東京 駅 "), Q(r).AddColumn("_ID");
         Q(r).SetOrderBy("ts", true); }},
-    {kSearch, "m", {}, {}, "SELECT m.* FROM m JOIN (SELECT rowid AS ulo_rowid, rank AS ulo_rank FROM ulo_search_i "
-     "WHERE ulo_search_i MATCH '\"\"') AS ulo_hit ON m.rowid = ulo_hit.ulo_rowid ORDER BY ulo_hit.ulo_rank",
-     [](DABaseSet& r) { S(r).SetIndex("i"), S(r).SetText(" \xC2\xA0 "), S(r).SetPrefixLast(); }},
 };
 // clang-format on
 
