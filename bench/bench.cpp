@@ -191,7 +191,7 @@ int main(int argc, char** argv)
     benchmark::AddCustomContext("compiler", __VERSION__);
     for (const bench::Location& location : ready ? locations : std::vector<bench::Location>{}) {
         for (const auto cases :
-             {bench::ConditionCases, bench::QueryCases, bench::SchemaCases, bench::SessionCases, bench::WriteCases}) {
+             {bench::ConditionCases, bench::QueryCases, bench::SchemaCases, bench::SessionCases, bench::TypedCases, bench::WriteCases}) {
             cases(location);
         }
     }

@@ -37,6 +37,7 @@ void NameCases();
 void QueryCases(const Location& at);
 void SchemaCases(const Location& at);
 void SessionCases(const Location& at);
+void TypedCases(const Location& at);
 void WriteCases(const Location& at);
 
 // A query case: fill(result) into a fresh cursor, or copying every value as text into one vector per column,

@@ -77,6 +77,42 @@ void bench::ConditionCases(const Location& at)
     query("cond/keyset" + name + "lib", keyset, 50);
     bench::AddQuery("cond/keyset" + name + "raw", 50, bench::Raw(path, sql));
     query("cond/keyset" + name + "offset", offset, 50);
+    // keysetrow: the page after a (ts, id) in the middle, ties broken by id, through an index on (ts, id).
+    auto rows = bench::Request<DAQueryRequest>(at, "events.db", "events");
+    rows->SetWhereRow({"ts", "id"}, DACompare::Less, {kFirst + kEvents / 2, std::int64_t{kEvents / 2}});
+    rows->SetOrderBy("ts", true);
+    rows->SetOrderBy("id", true);
+    rows->SetLimit(50);
+    DASqlGenerator().GetQuerySql(*rows, sql);
+    query("cond/keysetrow" + name + "lib", rows, 50);
+    bench::AddQuery("cond/keysetrow" + name + "raw", 50, bench::Raw(path, sql));
+    // increment: one counter by key, per call, and the same statement through sqlite3_exec.
+    auto counter = bench::Request<DAUpdateRequest>(at, "events.db", "counters");
+    counter->SetWhere("k", "unread");
+    counter->SetIncrement("n", 1);
+    DASqlGenerator().GetUpdateSql(*counter, sql);
+    if (bench::RawExec(path,
+                       "CREATE TABLE counters(k TEXT PRIMARY KEY, n INTEGER); INSERT INTO counters VALUES "
+                       "('unread', 0); CREATE INDEX events_ts_id ON events(ts, id);") != SQLITE_OK) {
+        return;
+    }
+    bench::Add("cond/increment" + name + "lib", [counter] { return DADatabase().Update(*counter); });
+    bench::Add("cond/increment" + name + "raw", [path, sql] { return bench::RawExec(path, sql); });
+    // unread: what a batch of 100 new messages costs to count, kept as 100 increments of the conversations'
+    // counters in the batch, or counted again over all messages (the 100,000 events as messages of 7
+    // conversations) with COUNT GROUP BY.
+    auto unread = std::make_shared<DABatchRequest>();
+    unread->SetPath(at.dir.c_str(), "events.db");
+    for (int i = 0; i < 100; ++i) {
+        DAUpsertRequest one;
+        one.SetTable("counters");
+        one.SetData("k", ("type" + std::to_string(i % 7)).c_str());
+        one.AddConflictKey("k");
+        one.SetIncrement("n", 1);
+        unread->Add(one);
+    }
+    bench::Add("cond/unread" + name + "counter", [unread] { return DADatabase().ExecuteBatch(*unread); });
+    query("cond/unread" + name + "recount", counts, 7);
     session->Open(*keyset);
     query("cond/keyset" + name + "session", keyset, 50, true);
     query("cond/keyset" + name + "sessionoffset", offset, 50, true);

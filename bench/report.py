@@ -17,7 +17,8 @@ LOCATIONS = ("tmpfs", "disk", "memory")
 # (title, section prefixes): one table each; docs/benchmarks.md says what each measures.
 SECTIONS = [("Write operations", ["write"]), ("Batches", ["batch"]), ("Queries", ["select", "join", "page", "exist"]),
             ("Reading a cursor", ["walk"]), ("Names", ["lock", "intern", "memory"]), ("Conditions", ["cond"]),
-            ("Schema", ["schema"]), ("Sessions", ["session"])]
+            ("Schema", ["schema"]), ("Sessions", ["session"]),
+            ("Typed reads", ["typed"])]
 
 
 def ratio(a, b, metric="real", per=None):
@@ -68,6 +69,9 @@ TARGETS = [
     *both("keyset page, {l}: lib / raw", "cond/keyset/{l}/lib", "raw", "<=", 1.8),
     *both("keyset page, {l}: offset / keyset", "cond/keyset/{l}/offset", "lib", ">=", 20),
     *both("keyset page, session, {l}: offset / keyset", "cond/keyset/{l}/sessionoffset", "session", ">=", 20),
+    *both("keyset page by (ts, id), {l}: lib / raw", "cond/keysetrow/{l}/lib", "raw", "<=", 1.8),
+    *both("increment a counter by key, {l}: lib / raw", "cond/increment/{l}/lib", "raw", "<=", 1.1),
+    *both("unread counts per batch of 100, {l}: recount / counters", "cond/unread/{l}/recount", "counter", ">=", 20),
     *both("`AddColumn`, 100k rows, {l}: lib / raw", "schema/AddColumn100000/{l}/lib", "raw", "<=", 1.2),
     *both("`AddColumn`, 100k rows, {l}: rewrite / lib", "schema/AddColumn100000/{l}/rewrite", "lib", ">=", 100),
     *both("`Migrate` up to date, {l}: lib / empty `Select`", "schema/MigrateUpToDate/{l}/lib", "select", "<=", 2),
@@ -83,6 +87,14 @@ TARGETS = [
         "session/EmptySelect1/tmpfs/lib", "<=", 1.2),
     *both("session reads beside a writer, {l}: 2 readers' reads/s / 1 reader's", "session/Readers1/{l}/lib",
           "session/Readers2/{l}/lib", ">=", 1.5, per="rows"),
+    one("`QueryEach` 200k rows, tmpfs: lib / raw typed reads", "typed/rows200000/tmpfs/lib", "raw", "<=", 1.3),
+    one("`Query` into `DATypedCursor` 200k rows, tmpfs: lib / raw typed copy", "typed/rows200000/tmpfs/typedcursor",
+        "rawcopy", "<=", 1.6),
+    one("`DATypedCursor` 200k rows: heap held / `DACursor`'s", "typed/rows200000/tmpfs/typedheld", "dacursorheld",
+        "<=", 0.4, "result_bytes"),
+    one("session `Query` by key into `DATypedCursor`, tmpfs: lib / raw", "typed/bykey/tmpfs/lib", "raw", "<=", 1.3),
+    one("1 MiB blob written and read per call, tmpfs: lib / raw", "typed/blob1MiB/tmpfs/lib", "raw", "<=", 2),
+    one("batch of 500 inserts, unsynced session, tmpfs: lib / raw", "typed/batch500/tmpfs/lib", "raw", "<=", 1.2),
     ("session held (KiB beyond the page cache)", of("session/Select/tmpfs/lib", "held_bytes", 1024), "<=", 1024),
 ]
 

@@ -3,9 +3,10 @@
 // 64-bit time stamp, name columns at run time, check and drop, write in a
 // batch, keep an event journal for a week (retention by a range, counts per
 // type, keyset pages), upgrade a schema in versioned steps, compact the
-// file and run requests through a session that holds it open, printing each
-// step's result code, the statement the library generated, every result as
-// a table, and the library's own log lines as they are written.
+// file, run requests through a session that holds it open and watch a table
+// from a second process, printing each step's result code, the statement
+// the library generated, every result as a table, and the library's own log
+// lines as they are written.
 //
 //   ulo_db_demo [directory]     (default: /tmp/ulo_db_demo, created if missing)
 //
@@ -14,6 +15,8 @@
 // the upgrade starts from a new file.
 
 #include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -27,6 +30,7 @@
 #include "DADatabase.h"
 #include "DASession.h"
 #include "DASqlGenerator.h"
+#include "DAWatch.h"
 #include "dlog.h"
 
 namespace {
@@ -594,6 +598,56 @@ void Session(DASqlGenerator& generator, const char* dir)
     std::printf("   open: %s\n", session.IsOpen() ? "yes" : "no");
 }
 
+// A watch in a second process: the child watches the contacts table and
+// waits, the parent writes; the child reports what it saw. Nothing of the
+// watch remains in the file after Unwatch.
+void Watch(DADatabase& db, const char* dir)
+{
+    DABasePath location;
+    location.SetPath(dir, kFile);
+    Step("Watch contacts from a second process (fork)", "triggers counting into \"ulo_db-watch\"");
+    int ready[2] = {-1, -1};
+    if (pipe(ready) != 0) {
+        Result(errno, 0);
+        return;
+    }
+    const pid_t child = fork();
+    if (child == 0) {
+        close(ready[0]);
+        DAWatch watch;
+        int rc = watch.Open(location) + watch.AddTable("contacts");
+        const char started = 'w';
+        rc += write(ready[1], &started, 1) == 1 ? 0 : 1;
+        std::vector<std::string> changed;
+        rc += watch.Wait(5000, changed);
+        std::printf("   watcher (pid %d): changed =", static_cast<int>(getpid()));
+        for (const std::string& table : changed) {
+            std::printf(" %s", table.c_str());
+        }
+        std::printf("\n");
+        _exit(rc == 0 && changed.size() == 1 ? 0 : 1);
+    }
+    close(ready[1]);
+    char started = 0;
+    const bool watching = child > 0 && read(ready[0], &started, 1) == 1;
+    close(ready[0]);
+    DAUpsertRequest upsert;
+    SetLocation(upsert, dir, "contacts");
+    upsert.SetData(kPhone, "010-6666");
+    upsert.SetData(kName, "Jang");
+    upsert.SetData(kGroupId, 1);
+    Step("Upsert a contact in this process", "INSERT OR REPLACE INTO contacts ...");
+    Result(watching ? db.Upsert(upsert) : -1, SQLITE_OK);
+    int status = -1;
+    if (child > 0) {
+        waitpid(child, &status, 0);
+    }
+    Step("The watcher saw it", "(exit status of the second process)");
+    Result(WIFEXITED(status) ? WEXITSTATUS(status) : -1, 0);
+    Step("Unwatch contacts: the triggers and the counter table go", "DROP TRIGGER ...; DROP TABLE \"ulo_db-watch\"");
+    Result(db.Unwatch(location, "contacts"), SQLITE_OK);
+}
+
 }  // namespace
 
 int main(int argc, char** argv)
@@ -621,6 +675,7 @@ int main(int argc, char** argv)
     Upgrade(db, generator, dir);
     Space(db, generator, dir);
     Session(generator, dir);
+    Watch(db, dir);
 
     std::printf("\n%s\n", g_unexpected == 0 ? "Every step gave the expected result." : "Some steps failed.");
     return g_unexpected == 0 ? 0 : 1;

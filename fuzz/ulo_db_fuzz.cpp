@@ -34,8 +34,21 @@ void CheckSplit(const std::string& sql)
             continue;
         }
         const DALiteral& value = values.at(next++);
-        if (value.integer) {
+        if (value.kind == DALiteral::Kind::Integer) {
             back += value.text;
+            continue;
+        }
+        if (value.kind == DALiteral::Kind::Null) {
+            back += "NULL";
+            continue;
+        }
+        if (value.kind == DALiteral::Kind::Blob) {
+            back += "X'";
+            for (const char v : value.text) {
+                back += "0123456789ABCDEF"[static_cast<unsigned char>(v) >> 4U];
+                back += "0123456789ABCDEF"[static_cast<unsigned char>(v) & 0xFU];
+            }
+            back += '\'';
             continue;
         }
         back += '\'';

@@ -2,10 +2,15 @@
 
 #include <atomic>
 #include <chrono>
+#include <cmath>
 #include <cstdint>
 #include <thread>
 
+#include <sys/wait.h>
+#include <unistd.h>
+
 #include "DADatabase.h"
+#include "DASession.h"
 #include "DASqlGenerator.h"
 #include "DatabaseTestUtil.h"
 #include "TempDirTest.h"
@@ -48,16 +53,31 @@ const OperatorCase kOperators[] = {
     {[](DABaseSet& r) { r.SetWhere("i", DACompare::NotEqual, "10"); }, "i<>'10'", "13"},
     {[](DABaseSet& r) { r.SetWhere("i", DACompare::Less, UINT64_MAX); }, "i<18446744073709551615", "123"},
     {[](DABaseSet& r) { r.SetWhere("r", DACompare::GreaterEqual, 2.5); }, "r>=2.5", "12"},
-    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Greater, 10); }, "t>10", "13"},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Greater, 10); }, "t>10", "1356"},
     {[](DABaseSet& r) { r.SetWhere("u", DACompare::Less, 10); }, "u<10", "1"},
     {[](DABaseSet& r) { r.SetWhere("u", DACompare::Less, "10"); }, "u<'10'", "12"},
-    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Like, "A%"); }, "t LIKE 'A%'", "3"},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Like, "A%"); }, "t LIKE 'A%'", "356"},
+    // Matched as typed: '%', '_' and '\\' are themselves, ASCII case folded.
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Contains, "50%"); }, "t LIKE '%50\\%%' ESCAPE '\\'", "5"},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Contains, "0_"); }, "t LIKE '%0\\_%' ESCAPE '\\'", ""},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Contains, "%_\\"); }, "t LIKE '%\\%\\_\\\\%' ESCAPE '\\'", "5"},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::StartsWith, "A5"); }, "t LIKE 'A5%' ESCAPE '\\'", "56"},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::EndsWith, "\\b"); }, "t LIKE '%\\\\b' ESCAPE '\\'", "5"},
+    {[](DABaseSet& r) { r.SetWhere("t", DACompare::Contains, ""); }, "t LIKE '%%' ESCAPE '\\'", "12356"},
+    {[](DABaseSet& r) {
+         r.SetWhereRow({"i", "id"}, DACompare::Less, {10, 2});
+     },
+     "(i, id)<(10, 2)", "1"},
+    {[](DABaseSet& r) {
+         r.SetWhereRow({"i", "m.id"}, DACompare::GreaterEqual, {10, 2});
+     },
+     "(i, m.id)>=(10, 2)", "23"},
     {[](DABaseSet& r) {
          r.SetWhereIn("t", {"9", "abc", "x'y"});
      },
      "t IN ('9', 'abc', 'x''y')", "13"},
     {[](DABaseSet& r) { r.SetWhereIn("i", {}); }, "i IN ()", ""},
-    {[](DABaseSet& r) { r.SetWhereNull("u"); }, "u IS NULL", "4"},
+    {[](DABaseSet& r) { r.SetWhereNull("u"); }, "u IS NULL", "456"},
     {[](DABaseSet& r) { r.SetWhereNull("m.u", false); }, "m.u IS NOT NULL", "123"},
 };
 
@@ -66,7 +86,7 @@ TEST_F(DAConditions, EachOperatorSelectsItsRows)
     RawDb(PathOf("t.db"))
         .Run("CREATE TABLE m(id INTEGER PRIMARY KEY, i INTEGER, r REAL, t TEXT, u);"
              "INSERT INTO m VALUES (1, 9, 2.5, '9', 9), (2, 10, 10.0, '10', 10), (3, 100, -1.5, 'abc', 'x'),"
-             "(4, NULL, NULL, NULL, NULL)");
+             "(4, NULL, NULL, NULL, NULL), (5, NULL, NULL, 'a50%_\\b', NULL), (6, NULL, NULL, 'a50xyb', NULL)");
     for (const OperatorCase& c : kOperators) {
         DAQueryRequest request;
         c.set(request);
@@ -108,23 +128,24 @@ TEST_F(DAConditions, RangesInUpdateAndDeleteCountTheirChanges)
               Described(log));
 }
 
-// Pages of 50 below the last time stamp seen, newest first, while another
-// thread keeps adding newer events (at a pace: a writer that never
-// pauses starves readers under the busy rule): every event up to the first page's
-// newest comes exactly once, in order.
-TEST_F(DAConditions, KeysetPagesMissNothingWhileAnotherThreadInserts)
+// Pages of 50 after the last (ts, id) seen, newest first, through one
+// request cleared for each page, while another thread adds newer events (at
+// a pace: a writer that never pauses starves readers under the busy rule);
+// 20 events share each time stamp, so ties cross page boundaries. Every
+// event up to the first page's newest comes exactly once, in order.
+TEST_F(DAConditions, KeysetPagesWithTiesMissNothingWhileAnotherThreadInserts)
 {
     RawDb(PathOf("t.db"))
-        .Run("CREATE TABLE e(id INTEGER PRIMARY KEY, ts INTEGER); CREATE INDEX e_ts ON e(ts);"
+        .Run("CREATE TABLE e(id INTEGER PRIMARY KEY, ts INTEGER); CREATE INDEX e_ts ON e(ts, id);"
              "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 420) "
-             "INSERT INTO e(ts) SELECT 1700000000000 + i FROM n");
+             "INSERT INTO e(ts) SELECT 1700000000000 + i / 20 FROM n");
     std::atomic<bool> done{false};
     std::atomic<int> written{0};
     std::thread writer([&] {
         DADatabase db;
-        for (std::int64_t ts = 1700000000421; !done.load(); ++ts, ++written) {
+        for (int k = 0; !done.load(); ++k, ++written) {
             DAInsertRequest insert;
-            At(insert, Dir(), "e").SetData("ts", ts);
+            At(insert, Dir(), "e").SetData("ts", std::int64_t{1700000000100 + k / 3});
             std::int64_t id = 0;
             EXPECT_EQ(0, db.Insert(insert, id));
             std::this_thread::sleep_for(std::chrono::milliseconds(5));  // events come at a pace
@@ -134,17 +155,19 @@ TEST_F(DAConditions, KeysetPagesMissNothingWhileAnotherThreadInserts)
         std::this_thread::yield();
     }
     std::vector<std::int64_t> seen;
-    for (std::int64_t last = INT64_MAX;;) {
-        DAQueryRequest page;
-        At(page, Dir(), "e").SetWhere("ts", DACompare::Less, last);
-        page.SetOrderBy("ts", true);
-        page.SetLimit(50);
+    DAQueryRequest page;
+    At(page, Dir(), "e").SetOrderBy("ts", true);
+    page.SetOrderBy("id", true);
+    page.SetLimit(50);
+    for (std::int64_t ts = INT64_MAX, id = INT64_MAX;;) {
+        page.ClearWhere();
+        page.SetWhereRow({"ts", "id"}, DACompare::Less, {ts, id});
         DACursor cursor;
         const int rc = DADatabase().Query(page, cursor);
         EXPECT_EQ(0, rc);
         while (cursor.MoveToNext() == 0) {
-            EXPECT_EQ(0, cursor.GetInt64("ts", last));
-            seen.push_back(last);
+            EXPECT_EQ(0, cursor.GetInt64("ts", ts) + cursor.GetInt64("id", id));
+            seen.push_back(id);
         }
         if (rc != 0 || cursor.GetCount() < 50) {
             break;
@@ -152,12 +175,67 @@ TEST_F(DAConditions, KeysetPagesMissNothingWhileAnotherThreadInserts)
     }
     done.store(true);
     writer.join();
-    EXPECT_GT(seen.front(), 1700000000420) << "the writer's first event is on the first page";
+    EXPECT_GT(seen.front(), 420) << "the writer's first event is on the first page";
     ASSERT_GE(seen.size(), 420U);
     for (std::size_t i = 0; i < seen.size(); ++i) {
         ASSERT_EQ(seen.front() - static_cast<std::int64_t>(i), seen[i]) << i;
     }
-    EXPECT_EQ(1700000000001, seen.back());
+    EXPECT_EQ(1, seen.back());
+}
+
+// Every refused form: one line, nothing stored (the statement unchanged).
+TEST_F(DAConditions, RefusedFormsStoreNothingWithOneLine)
+{
+    const std::pair<void (*)(DAUpsertRequest&), const char*> cases[] = {
+        {[](DAUpsertRequest& r) {
+             r.SetWhereRow({"a", "b c"}, DACompare::Less, {1, 2});
+         },
+         "INVALID COLUMN NAME, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) {
+             r.SetWhereRow({"a", nullptr}, DACompare::Less, {1, 2});
+         },
+         "INVALID COLUMN NAME, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) {
+             r.SetWhereRow({"a", "b"}, DACompare::Less, {1});
+         },
+         "COLUMN AND VALUE COUNTS DIFFER, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetWhereRow({}, DACompare::Less, {}); },
+         "COLUMN AND VALUE COUNTS DIFFER, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetWhereRow({"a"}, DACompare::Like, {"x"}); },
+         "INVALID OPERATOR, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetWhereRow({"a"}, DACompare::Less, {static_cast<char const*>(nullptr)}); },
+         "NULL VALUE, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetWhereRow({"a"}, DACompare::Less, {NAN}); },
+         "INVALID NUMBER, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetWhereRow({"a"}, DACompare::Less, {DAValue::Blob(nullptr, 1)}); },
+         "NULL BLOB, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetWhere("a", DACompare::Contains, 5); },
+         "TEXT MATCH OF A NUMBER, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetWhere("a", DACompare::EndsWith, 5ULL); },
+         "TEXT MATCH OF A NUMBER, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetWhere("a", DACompare::StartsWith, std::string(49999, '%').c_str()); },
+         "PATTERN TOO LONG, CONDITION NOT STORED"},
+        {[](DAUpsertRequest& r) { r.SetIncrement("a;b", 1); }, "INVALID COLUMN NAME, VALUE NOT STORED"},
+        {[](DAUpsertRequest& r) { r.AddConflictKey("t.k"); }, "INVALID COLUMN NAME, KEY NOT STORED"},
+        {[](DAUpsertRequest& r) { r.AddConflictKey(nullptr); }, "INVALID COLUMN NAME, KEY NOT STORED"},
+    };
+    for (const auto& [set, line] : cases) {
+        DAUpsertRequest request;
+        request.SetTable("t");
+        request.SetData("v", "1");
+        std::string before;
+        std::string after;
+        DASqlGenerator().GetUpsertSql(request, before);
+        const LogCapture log;
+        set(request);
+        DASqlGenerator().GetUpsertSql(request, after);
+        EXPECT_EQ(before, after) << line;
+        std::vector<DABaseSet::Condition> conditions;
+        request.GetConditions(conditions);
+        EXPECT_TRUE(conditions.empty()) << line;
+        ASSERT_EQ(1U, log.Lines().size()) << line;
+        EXPECT_EQ(line, log.Lines()[0].message);
+    }
 }
 
 // COUNT and MAX per type, the largest group first.
@@ -214,3 +292,74 @@ TEST_F(DAConditions, InsertGivesTheRowIdOrFailsOnAClashUnlessIgnored)
 }
 
 }  // namespace
+
+// A counter incremented at once by 2 processes and 4 threads of this one
+// (per call, and through one shared session) ends exact; each of 4
+// processes migrating at once, exactly one reports each step as applied.
+TEST_F(DAConditions, CountersAndStepsStayExactUnderConcurrentWriters)
+{
+    RawDb(PathOf("t.db")).Run("CREATE TABLE c(k TEXT PRIMARY KEY, n INTEGER); INSERT INTO c VALUES ('a', 0);");
+    constexpr int kEach = 50;
+    const auto increment = [&](auto& target) {
+        DAUpdateRequest counter;
+        At(counter, Dir(), "c").SetWhere("k", "a");
+        counter.SetIncrement("n", 1);
+        int failures = 0;
+        for (int i = 0; i < kEach; ++i) {
+            failures += target.Update(counter) != 0 ? 1 : 0;
+        }
+        return failures;
+    };
+    const auto migrate = [&] {  // the steps this process applied, as bits
+        DABatchRequest step;
+        DAUpdateRequest counter;
+        At(counter, Dir(), "c").SetWhere("k", "a");
+        counter.SetIncrement("n", 1000);
+        At(step, Dir()).Add(counter);
+        int bits = 0;
+        for (int version = 1; version <= 3; ++version) {
+            bool applied = false;
+            bits |= DADatabase().Migrate(step, version, applied) == 0 && applied ? 1 << version : 0;
+        }
+        return bits;
+    };
+    dlog_set_sink(&dlog_discard_sink, nullptr);
+    std::vector<pid_t> children;
+    for (int p = 0; p < 6; ++p) {
+        const pid_t pid = fork();
+        if (pid == 0) {
+            DADatabase db;
+            _exit(p < 2 ? increment(db) : 0x40 | migrate());
+        }
+        children.push_back(pid);
+    }
+    DASession session;
+    DABasePath location;
+    ASSERT_EQ(0, session.Open(At(location, Dir())));
+    std::atomic<int> failures{0};
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 4; ++t) {
+        threads.emplace_back([&, t] {
+            DADatabase db;
+            failures += t < 2 ? increment(db) : increment(session);
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    int applied[4] = {0, 0, 0, 0};
+    for (const pid_t pid : children) {
+        int status = 0;
+        ASSERT_EQ(pid, waitpid(pid, &status, 0));
+        const int code = WEXITSTATUS(status);
+        failures += (code & 0x40) != 0 ? 0 : code;
+        for (int version = 1; version <= 3 && (code & 0x40) != 0; ++version) {
+            applied[version] += (code >> version) & 1;
+        }
+    }
+    session.Close();
+    dlog_set_sink(nullptr, nullptr);
+    EXPECT_EQ(0, failures.load());
+    EXPECT_EQ(1, applied[1] * applied[2] * applied[3]) << applied[1] << applied[2] << applied[3];
+    EXPECT_EQ(std::to_string(6 * kEach + 3000), RawDb(PathOf("t.db")).Query("SELECT n FROM c"));
+}

@@ -1,6 +1,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <cstdint>
 #include <cstdlib>
 #include <string>
 
@@ -208,6 +209,14 @@ TEST_F(SearchTest, RanksSnipsNarrowsAndPages)
     search.SetLimit(1, 1);
     EXPECT_EQ(0, m_db.Search(search, cursor));
     EXPECT_EQ("1", ColumnValues(cursor, "_ID").at(0));
+    DATypedCursor typed;  // the same rows, typed
+    std::string excerpt;
+    std::int64_t id = 0;
+    EXPECT_EQ(0,
+              m_db.Search(search, typed) + typed.MoveToNext() + typed.GetRow().GetInt64("_ID", id) +
+                  typed.GetRow().GetString("excerpt", excerpt));
+    EXPECT_EQ(1, typed.GetCount() * id);
+    EXPECT_EQ("[Caf]é …", excerpt);  // a trigram is a token
 }
 
 }  // namespace

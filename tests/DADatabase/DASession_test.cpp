@@ -4,13 +4,16 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <functional>
 #include <regex>
 #include <string>
+#include <thread>
 
 #include <gtest/gtest.h>
 
 #include "DADatabase.h"
+#include "DAWatch.h"
 #include "DatabaseTestUtil.h"
 #include "TempDirTest.h"
 
@@ -211,6 +214,55 @@ const OperationCase kOperations[] = {
              (t.session != nullptr ? t.session->DropSearchIndex("names") : t.db->DropSearchIndex(At(at, dir), "names"));
          return rc * 10 + RUN(t, Search, search, cursor) + RUN(t, CreateSearchIndex, index);
      }},
+    {"keeping_rows_counters_row_ids_applied_steps",
+     [](Target& t, const std::string& dir, DACursor& cursor) {
+         DAUpsertRequest keep;  // updates row 1 in place: its phone stays
+         At(keep, dir, "contacts").SetData("_ID", 1);
+         keep.SetData("name", "Cho");
+         keep.AddConflictKey("_ID");
+         DAUpsertRequest replace;  // replaces row 2: its phone is gone
+         At(replace, dir, "contacts").SetData("_ID", 2);
+         replace.SetData("name", "Min");
+         DAUpdateRequest counter;
+         Make(counter, dir, "groups", "title", "Work").SetIncrement("_ID", 10);
+         DAInsertRequest added;
+         DAInsertRequest ignored;
+         At(added, dir, "groups").SetData("title", "Club");
+         At(ignored, dir, "groups").SetData("_ID", 1);
+         ignored.SetIgnoreExisting();
+         DABatchRequest step;
+         At(step, dir).Add(added);
+         step.Add(counter);
+         step.Add(ignored);
+         step.Add(added);
+         bool applied[2] = {false, true};
+         int rc = RUN(t, Upsert, keep) + RUN(t, Upsert, replace) + RUN(t, Update, counter);
+         rc = rc * 10 + RUN(t, Migrate, step, 1, applied[0]) + RUN(t, Migrate, step, 1, applied[1]);
+         rc = rc * 10 + RUN(t, ExecuteBatch, step);
+         std::vector<std::int64_t> ids;
+         step.GetRowIds(ids);
+         std::string state = std::to_string(applied[0]) + std::to_string(applied[1]);
+         for (const std::int64_t id : ids) {
+             state += " " + std::to_string(id);
+         }
+         RawDb raw(dir + "/t.db");
+         state +=
+             " / " + raw.Query("SELECT * FROM contacts WHERE _ID < 3") + " / " + raw.Query("SELECT _ID FROM groups");
+         EXPECT_EQ("10 24 -1 33 / 1|Cho|010;2|Min|NULL / 1;13;23;24;32;33", state);
+         cursor.SetColumn("state");
+         cursor.SetData("state", state.c_str());
+         return rc;
+     }},
+    {"unwatch",  // removes the triggers and counters a watch installed; refuses a name that is not plain
+     [](Target& t, const std::string& dir, DACursor&) {
+         DAWatch watch;
+         DABasePath at;
+         const int rc = watch.Open(At(at, dir)) + watch.AddTable("contacts");
+         watch.Close();
+         return rc * 100 +
+             (t.session != nullptr ? t.session->Unwatch("contacts") * 10 + t.session->Unwatch("a b")
+                                   : t.db->Unwatch(at, "contacts") * 10 + t.db->Unwatch(at, "a b"));
+     }},
     {"batch",
      [](Target& t, const std::string& dir, DACursor&) {
          DABatchRequest batch;
@@ -305,6 +357,10 @@ TEST_F(SessionTest, RefusesWithOneLine)
     EXPECT_EQ(21, session.CheckExistTable("contacts", exists));
     EXPECT_EQ(14, OpenAt(session, PathOf("missing")));
     EXPECT_FALSE(FileExists("missing"));
+    session.SetCreate(false);  // a file that does not exist is not made
+    EXPECT_EQ(14, OpenAt(session, Dir()));
+    EXPECT_FALSE(FileExists("t.db"));
+    session.SetCreate(true);
     EXPECT_FALSE(session.IsOpen());
     std::ofstream(PathOf("text.db")) << std::string(5000, 'x');
     DABasePath text;
@@ -326,6 +382,7 @@ TEST_F(SessionTest, RefusesWithOneLine)
     };
     EXPECT_EQ(
         (Strings{line(6, "Upsert", "SESSION NOT OPEN"), line(6, "CheckExistTable", "SESSION NOT OPEN"),
+                 line(6, "Open", "DB open failed. Error no(14): unable to open database file"),
                  line(6, "Open", "DB open failed. Error no(14): unable to open database file"),
                  line(6, "Open", "DB open failed. Error no(26): file is not a database"),
                  line(6, "Select",
@@ -497,6 +554,46 @@ TEST_F(SessionTest, DescriptorsStayConstant)
     EXPECT_EQ(descriptors, OpenDescriptorCount());
     session.Close();
     EXPECT_EQ(closed, OpenDescriptorCount());
+}
+
+// Another connection's write lock: the session's write goes on within 25 ms
+// of its release with one warning; held past 1.5 s, the write gives up with
+// 5 and the limit line.
+TEST_F(SessionTest, WaitsForAnotherConnectionInShortSteps)
+{
+    const std::string dir = Seeded("db");
+    DASession session;
+    ASSERT_EQ(0, OpenAt(session, dir));
+    RawDb holder(dir + "/t.db");
+    DAUpsertRequest upsert;
+    At(upsert, dir, "groups").SetData("title", "Club");
+    const auto line = [](int priority, const char* function, const std::string& message) {
+        return Logged(priority, "DASession.cpp", function, message);
+    };
+    for (const int holdMs : {200, 1700}) {
+        holder.Run("BEGIN EXCLUSIVE");
+        std::chrono::steady_clock::time_point released;
+        std::thread release([&] {
+            std::this_thread::sleep_for(std::chrono::milliseconds(holdMs));
+            holder.Run("COMMIT");
+            released = std::chrono::steady_clock::now();
+        });
+        LogCapture log;
+        const int rc = session.Upsert(upsert);
+        const auto done = std::chrono::steady_clock::now();
+        release.join();
+        Strings expected{line(5, "IsRetryLimit", "SQLITE BUSY[1]")};
+        if (holdMs < 1000) {
+            EXPECT_EQ(0, rc);
+            EXPECT_LT(done - released, std::chrono::milliseconds(25));
+            expected.push_back(line(4, "Upsert", "Upsert SUCCESS[0]"));
+        } else {
+            EXPECT_EQ(5, rc);
+            expected.push_back(line(6, "IsRetryLimit", "RETRY COUNT is reached LIMIT, SQLITE_BUSY"));
+            expected.push_back(line(6, "Upsert", "Upsert FAILED[5]: database is locked"));
+        }
+        EXPECT_EQ(expected, Described(log));
+    }
 }
 
 // A failure at the step of a statement kept by shape logs SQLite's own text

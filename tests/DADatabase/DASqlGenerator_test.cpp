@@ -158,6 +158,7 @@ const Kind kSearch = Generated<DASearchRequest, &DASqlGenerator::GetSearchSql>;
 // Listed conditions and select lists, as the rows below use them.
 const auto Q = [](DABaseSet& r) -> DAQueryRequest& { return static_cast<DAQueryRequest&>(r); };
 const auto S = [](DABaseSet& r) -> DASearchRequest& { return static_cast<DASearchRequest&>(r); };
+const auto U = [](DABaseSet& r) -> DAUpsertRequest& { return static_cast<DAUpsertRequest&>(r); };
 const auto TsBefore = [](DABaseSet& r) { r.SetWhere("ts", DACompare::Less, std::int64_t{1700000000000}); };
 
 const char* const kContacts = "contacts";
@@ -284,6 +285,40 @@ const SqlCase kCases[] = {
      "'%''trigram''%' THEN '\"東京 駅\"' ELSE '\"東京\" \"駅\"' END) AS ulo_hit ON m.rowid = ulo_hit.ulo_rowid "
      "ORDER BY ts DESC", [](DABaseSet& r) { S(r).SetIndex("i"), S(r).SetText("東京 駅 "), Q(r).AddColumn("_ID");
         Q(r).SetOrderBy("ts", true); }},
+    {kUpsert, kContacts, {{kName, "Kim"}}, {},
+     "INSERT OR REPLACE INTO contacts (name, photo, email) VALUES ('Kim', X'89504E47', NULL)",
+     [](DABaseSet& r) { r.SetBlob("photo", "\x89PNG", 4), r.SetNull("email"); }},
+    {kUpdate, kContacts, {}, {{kName, "Kim"}}, "UPDATE contacts SET email = NULL WHERE name='Kim'",
+     [](DABaseSet& r) { r.SetNull("email"); }},
+    {kInsert, "t", {{kName, "a"}}, {}, "INSERT INTO t (name, p, q) VALUES ('a', X'', X'00FF0A')",
+     [](DABaseSet& r) { r.SetBlob("p", nullptr, 0), r.SetNull(kName), r.SetBlob("q", "\0\xFF\n", 3), r.SetNull("p"); }},
+    {kUpsert, "t", {}, {}, "INSERT OR REPLACE INTO t (name, phone) VALUES ('n', NULL)",  // the first value wins
+     [](DABaseSet& r) { r.SetNull(kPhone), r.SetData(kPhone, "1"), r.SetData(kName, "n"); }},
+    // Counters, upserts that keep the row, row values, literal text matches, cleared parts.
+    {kUpdate, "conversations", {}, {{"id", "7"}}, "UPDATE conversations SET unread = unread + 1, left = left - 1, "
+     "low = low + -9223372036854775808 WHERE id='7'", [](DABaseSet& r) {
+        r.SetIncrement("unread", 1), r.SetIncrement("left", -1), r.SetIncrement("low", INT64_MIN); }},
+    {kUpsert, kContacts, {{kPhone, "010"}, {kName, "Kim"}}, {}, "INSERT INTO contacts (name, phone, email, calls) "
+     "VALUES ('Kim', '010', NULL, 1) ON CONFLICT(phone) DO UPDATE SET name = excluded.name, email = excluded.email, "
+     "calls = calls + 1", [](DABaseSet& r) {
+        U(r).AddConflictKey("phone"), r.SetIncrement("calls", 1), r.SetNull("email"), r.SetIncrement(kName, 5); }},
+    {kUpsert, kContacts, {{kPhone, "010"}}, {},
+     "INSERT INTO contacts (phone) VALUES ('010') ON CONFLICT(phone, owner) DO NOTHING",
+     [](DABaseSet& r) { U(r).AddConflictKey("phone"), U(r).AddConflictKey("owner"); }},
+    {kSelect, "t", {}, {}, "SELECT * FROM t WHERE (ts, _ID)<(1700000000123, 42) AND (a, b, c, d, e)>=('x''y', "
+     "X'00FF', NULL, 2.5, 18446744073709551615)", [](DABaseSet& r) {
+        r.SetWhereRow({"ts", "_ID"}, DACompare::Less, {std::int64_t{1700000000123}, 42});
+        r.SetWhereRow({"a", "b", "c", "d", "e"}, DACompare::GreaterEqual,
+                      {"x'y", DAValue::Blob("\0\xFF", 2), DAValue::Null(), 2.5, UINT64_MAX}); }},
+    {kSelect, "t", {}, {}, "SELECT * FROM t WHERE b LIKE '%50\\%%' ESCAPE '\\' AND s LIKE 'a\\_b%' ESCAPE '\\' AND "
+     "e LIKE '%\\\\' ESCAPE '\\'", [](DABaseSet& r) {
+        r.SetWhere("b", DACompare::Contains, "50%"), r.SetWhere("s", DACompare::StartsWith, "a_b");
+        r.SetWhere("e", DACompare::EndsWith, "\\"); }},
+    {kQuery, "t", {{kName, "n"}}, {{kPhone, "1"}}, "SELECT * FROM t WHERE a=1", [](DABaseSet& r) {
+        Q(r).SetOrderBy("ts"), Q(r).SetLimit(5, 5), r.SetWhere("x", DACompare::Less, 3), Q(r).ClearOrderBy();
+        Q(r).ClearLimit(), r.ClearWhere(), r.ClearData(), r.SetWhere("a", DACompare::Equal, 1); }},
+    {kUpdate, "t", {{kName, "n"}}, {}, "UPDATE t SET name = 'm', phone = NULL WHERE ", [](DABaseSet& r) {
+        r.SetNull(kPhone), r.ClearData(), r.SetData(kName, "m"), r.SetNull(kPhone); }},
 };
 // clang-format on
 

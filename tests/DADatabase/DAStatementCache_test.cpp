@@ -7,8 +7,8 @@
 
 namespace {
 
-// A generated text, its shape and its literals, integers marked "#" (an
-// empty shape: the text is not split).
+// A generated text, its shape and its literals, integers marked "#", NULL
+// as "null", blobs "x" (an empty shape: the text is not split).
 struct SplitCase {
     const char* sql;
     const char* shape;
@@ -27,6 +27,15 @@ const SplitCase kSplits[] = {
      "SELECT c0 FROM t WHERE r>=2.5 AND e<1e+100 AND u<18446744073709551615 ORDER BY c0 LIMIT -? OFFSET ?",
      {"#1", "#20"}},
     {"DELETE  FROM t", "DELETE  FROM t", {}},
+    {"INSERT INTO t (a, p, e, f) VALUES ('NULL', X'00FF', NULL, X'')",
+     "INSERT INTO t (a, p, e, f) VALUES (?, ?, ?, ?)",
+     {"NULL", std::string("x\0\xFF", 3), "null", "x"}},
+    {"UPDATE t SET e = NULL, f = NULLS WHERE g IS NULL AND h=NULL",
+     "UPDATE t SET e = ?, f = NULLS WHERE g IS NULL AND h=?",
+     {"null", "null"}},
+    {"SELECT * FROM t WHERE a=X'0'", "", {}},
+    {"SELECT * FROM t WHERE a=X'0a'", "", {}},
+    {"SELECT * FROM t WHERE a=X'00'b", "", {}},
     {"CREATE INDEX IF NOT EXISTS i ON t (a)", "", {}},
     {"ALTER TABLE t ADD COLUMN c TEXT DEFAULT '0'", "", {}},
     {"SELECT * FROM t WHERE a='1'; DROP TABLE t", "", {}},
@@ -40,6 +49,7 @@ const SplitCase kSplits[] = {
 
 TEST(DASplitLiterals, TakesOutTheLiteralsOfPlainDmlOnly)
 {
+    const char* const kMarks[] = {"", "#", "null", "x"};
     for (const SplitCase& c : kSplits) {
         std::string shape;
         std::vector<DALiteral> values;
@@ -48,7 +58,7 @@ TEST(DASplitLiterals, TakesOutTheLiteralsOfPlainDmlOnly)
         if (split) {
             std::vector<std::string> texts;
             for (const DALiteral& value : values) {
-                texts.push_back((value.integer ? "#" : "") + value.text);
+                texts.push_back(kMarks[static_cast<int>(value.kind)] + value.text);
             }
             EXPECT_EQ(c.shape, shape);
             EXPECT_EQ(c.values, texts);

@@ -10,6 +10,8 @@
 #include <DAColumnName.h>
 #include <DACreateRequest.h>
 #include <DACursor.h>
+#include <DARow.h>
+#include <DATypedCursor.h>
 #include <DADatabase.h>
 #include <DADatabaseParser.h>
 #include <DADeleteRequest.h>

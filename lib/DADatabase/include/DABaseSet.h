@@ -1,6 +1,7 @@
 #ifndef DABASESET_H
 #define DABASESET_H
 
+#include <cstddef>
 #include <cstdint>
 #include <map>
 #include <string>
@@ -9,28 +10,18 @@
 
 #include "DABasePath.h"
 #include "DAOwnedString.h"
+#include "DAValue.h"
 
 /// Column name (the caller's pointer, compared by address) to value text.
 using DAValueMap = std::map<char const*, std::string>;
 
 /// The comparison of a listed condition (DABaseSet::SetWhere with an
-/// operator): =, <>, <, <=, >, >= and LIKE.
-enum class DACompare { Equal, NotEqual, Less, LessEqual, Greater, GreaterEqual, Like };
-
-/// Whether Integer is an integer type that the int and std::int64_t
-/// overloads of DABaseSet do not take exactly: short, long, long long and
-/// the unsigned types, but not bool, the character types, int or
-/// std::int64_t (those keep the overloads they always picked).
-template <typename Integer>
-struct DAIsOtherInteger
-    : std::integral_constant<bool,
-                             std::is_integral<Integer>::value && !std::is_same<Integer, bool>::value &&
-                                 !std::is_same<Integer, char>::value && !std::is_same<Integer, signed char>::value &&
-                                 !std::is_same<Integer, unsigned char>::value &&
-                                 !std::is_same<Integer, wchar_t>::value && !std::is_same<Integer, char16_t>::value &&
-                                 !std::is_same<Integer, char32_t>::value && !std::is_same<Integer, int>::value &&
-                                 !std::is_same<Integer, std::int64_t>::value> {
-};
+/// operator): =, <>, <, <=, >, >= and LIKE, and the literal text matches
+/// Contains, StartsWith and EndsWith (text values only): the value is
+/// matched as typed, '%', '_' and '\\' included, written as "body LIKE
+/// '%50\\%%' ESCAPE '\\'". Their case folding is SQLite's LIKE's: ASCII
+/// letters only. For words in any language use full-text search.
+enum class DACompare { Equal, NotEqual, Less, LessEqual, Greater, GreaterEqual, Like, Contains, StartsWith, EndsWith };
 
 /// A database location plus two value maps: the data map (values to write)
 /// and the where map (equality conditions). Base of the table requests and
@@ -66,6 +57,41 @@ public:
     /// and first-value-wins rule as the other setters. Chosen for
     /// std::int64_t arguments; int and double keep their own overloads.
     void SetData(char const* column, std::int64_t value);
+
+    /// A value of the data part that is not text: NULL, bytes, or an
+    /// increment.
+    struct TypedValue {
+        char const* column = nullptr;  ///< the caller's column-name pointer
+        bool null = true;  ///< NULL; otherwise the blob in bytes (or an increment)
+        std::vector<unsigned char> bytes;  ///< the blob's bytes
+        bool increment = false;  ///< column = column + delta
+        std::int64_t delta = 0;  ///< the increment's delta
+    };
+
+    /// Sets column to column + delta: "unread = unread + 1" in an update
+    /// ("unread = unread - 1" for -1), and delta itself (unquoted) where
+    /// an insert writes the row. The rules and line of SetNull.
+    void SetIncrement(char const* column, std::int64_t delta);
+
+    /// Sets column to NULL in the data part: written NULL in the statement.
+    /// Column names are kept by pointer as for SetData, and one pointer
+    /// stands once in the data part: the first value set under it wins,
+    /// whichever setter (SetData, SetNull, SetBlob) set it. Typed values
+    /// are written after the data map's columns, in call order. A null or
+    /// non-plain column name (see SetWhere with an operator) is refused
+    /// with the error line "INVALID COLUMN NAME, VALUE NOT STORED".
+    /// Holds the data map's member lock.
+    void SetNull(char const* column);
+
+    /// Sets column to a blob of the size bytes at data, copied at the call:
+    /// written X'89504E47' (upper-case hex) in the statement, X'' when size
+    /// is 0 (data may then be null). The rules of SetNull; a null data with
+    /// a size is refused with the error line "NULL BLOB, NOT STORED".
+    /// Throws nothing but std::bad_alloc (nothing stored then).
+    void SetBlob(char const* column, void const* data, std::size_t size);
+
+    /// Replaces out by a copy of the typed values in call order.
+    void GetTypedData(std::vector<TypedValue>& out);
 
     ///@{
     /// The same for the where map.
@@ -126,15 +152,37 @@ public:
     /// false, to the listed conditions, with the rules above.
     void SetWhereNull(char const* column, bool isNull = true);
 
+    /// Appends the row-value comparison "(ts, _ID)<(1700000000123, 42)" to
+    /// the listed conditions: for keyset pages that never skip or repeat a
+    /// row when many rows share a time stamp. Column names are copied and
+    /// must be plain; values are written as DAValue writes them. op must be
+    /// Less, LessEqual, Greater, GreaterEqual, Equal or NotEqual. Refused,
+    /// nothing stored, with one error line: a column that is not plain
+    /// ("INVALID COLUMN NAME, CONDITION NOT STORED"), counts that differ or
+    /// are 0 ("COLUMN AND VALUE COUNTS DIFFER, CONDITION NOT STORED"),
+    /// another op ("INVALID OPERATOR, CONDITION NOT STORED"), a value that
+    /// cannot be written (its DAValue::GetFailure line).
+    void SetWhereRow(std::vector<char const*> const& columns, DACompare op, std::vector<DAValue> const& values);
+
+    /// Empties the data part: the data map and every value SetNull, SetBlob
+    /// and SetIncrement added. Under the data map's member lock.
+    void ClearData();
+
+    /// Empties the where part: the where map (under its member lock) and
+    /// the listed conditions (under theirs).
+    void ClearWhere();
+
     /// One listed condition, as the generator writes it.
     struct Condition {
-        /// What the condition tests.
-        enum class Form { Compare, In, Null, NotNull };
+        /// What the condition tests; Row: columns op values, each value as
+        /// its SQL text.
+        enum class Form { Compare, In, Null, NotNull, Row };
         std::string column;  ///< the plain column name
         Form form = Form::Compare;  ///< the kind of condition
         DACompare op = DACompare::Equal;  ///< the comparison, for Form::Compare
         std::vector<std::string> values;  ///< one value to compare with, or the IN list
         bool number = false;  ///< the one value is a number, written unquoted
+        std::vector<std::string> columns;  ///< the columns of a Row comparison
     };
 
     /// Replaces out by a copy of the listed conditions in call order.
@@ -173,10 +221,16 @@ private:
         DACompare op;
         std::vector<std::string> values;
         bool number;
+        std::vector<std::string> columns;
     };
+
+    // Stores a typed value under the data map's lock unless its column
+    // already has a value.
+    void AddTyped(TypedValue value, const char* func);
 
     DAValueMap m_dataMap;
     DAValueMap m_whereMap;
+    std::vector<TypedValue> m_typed;  // guarded by m_dataMap's lock
     std::vector<StoredCondition> m_conditions;
 };
 

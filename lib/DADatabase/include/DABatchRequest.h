@@ -1,6 +1,7 @@
 #ifndef DABATCHREQUEST_H
 #define DABATCHREQUEST_H
 
+#include <cstdint>
 #include <string>
 #include <vector>
 
@@ -84,6 +85,11 @@ public:
     /// that create or drop tables count 0); 0 before any.
     int GetChanges() const { return m_changes; }
 
+    /// After a successful ExecuteBatch of this batch, one row id per Insert
+    /// added, in Add order (-1 for a row an OR IGNORE insert left out);
+    /// empty after a failed one and before any.
+    void GetRowIds(std::vector<std::int64_t>& ids) const { ids = m_rowIds; }
+
 private:
     // The operation that runs the batch reads the texts and sets the change
     // count.
@@ -100,6 +106,8 @@ private:
     std::vector<char> m_texts;
     int m_count = 0;
     int m_changes = 0;
+    std::vector<int> m_inserts;  // the 1-based positions of the inserts, ascending
+    std::vector<std::int64_t> m_rowIds;
     // Add's scratch for comparing locations.
     std::string m_scratch[4];
 };

@@ -2,6 +2,7 @@
 #define DADATABASE_H
 
 #include <cstdint>
+#include <functional>
 #include <string>
 
 #include <sqlite3.h>
@@ -17,9 +18,11 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DARow.h"
 #include "DASearchIndexRequest.h"
 #include "DASearchRequest.h"
 #include "DASelectRequest.h"
+#include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
@@ -103,6 +106,25 @@ public:
     /// the cursor.
     int Query(DAQueryRequest& request, DACursor& cursor);
 
+    /// Query into a typed cursor: the same statement, codes and lines (under
+    /// "Query"), each value kept with its stored type and bytes (DARow.h).
+    /// A failure before the first step (open, preparation) leaves cursor as
+    /// it was; otherwise it holds the rows read, positioned before the
+    /// first (-1), with the step failure's code returned after the rows read
+    /// before it.
+    int Query(DAQueryRequest& request, DATypedCursor& cursor);
+
+    /// Query's statement, codes and lines (under "QueryEach"), handing the
+    /// rows to visit one at a time: memory does not grow with the rows. The
+    /// row is valid during the call only. visit returning false ends the
+    /// read with 0; a step failure returns its code after the rows before
+    /// it were visited. An exception from visit passes through, after the
+    /// statement is finalized and the file closed. The file is read
+    /// (locked against writers, unless it is in WAL mode) until the read
+    /// ends: a write to it from visit meets that lock, as another
+    /// connection would (busy-retry, then 5).
+    int QueryEach(DAQueryRequest& request, std::function<bool(DARow const&)> const& visit);
+
     /// exists: whether a table named exactly tableName exists. A null
     /// tableName throws std::logic_error (the connection is closed first).
     int CheckExistTable(DABasePath& location, char const* tableName, bool& exists);
@@ -146,6 +168,11 @@ public:
     /// nothing opened. An app calls Migrate once per step, in version
     /// order, at every start.
     int Migrate(DABatchRequest& step, int version);
+
+    /// Migrate, telling what it did: applied is true only when this call
+    /// ran the step (its "Migrate SUCCESS" line), false otherwise, also
+    /// when another process ran it first.
+    int Migrate(DABatchRequest& step, int version, bool& applied);
 
     /// The size of location's file and the part of it its free pages take,
     /// in bytes (page count and free-list count times the page size).
@@ -206,6 +233,20 @@ public:
     /// fails at the preparation with 1 and SQLite's text ("no such table:
     /// ulo_search_i").
     int Search(DASearchRequest& request, DACursor& cursor);
+    /// Search into a typed cursor: the statement, codes and lines of the
+    /// search, the cursor handled as Query's typed overload handles it.
+    int Search(DASearchRequest& request, DATypedCursor& cursor);
+
+    /// Removes from location's file what watching table left there (see
+    /// DAWatch.h): its three triggers and its counter, and the counter table
+    /// with the last counter, in one transaction under the write lock (the
+    /// busy-retry rule). A table never watched leaves the file unchanged.
+    /// Every DAWatch of that table, in any process, reports it once more at
+    /// its next Check and then no longer watches it. Returns 0 with the line
+    /// "Unwatch SUCCESS[0]", or the code with "Unwatch FAILED[rc]: text"; a
+    /// null or non-plain table name returns 21 with the one line "Unwatch
+    /// FAILED[21]: table name is not a plain name", nothing opened.
+    int Unwatch(DABasePath& location, char const* table);
 };
 
 #endif  // DADATABASE_H

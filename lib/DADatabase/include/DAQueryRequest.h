@@ -43,6 +43,13 @@ public:
     /// when no key is set.
     void GetOrderBy(DAOrderKeys& keys);
 
+    /// Drops every sort key (under the sort-key list's member lock), so one
+    /// request serves page after page.
+    void ClearOrderBy();
+
+    /// Drops the limit and offset: the whole result again.
+    void ClearLimit();
+
     /// Assigns the page of the last SetLimit to count (-1 for no limit) and
     /// offset (0 or more); leaves both untouched when SetLimit was never
     /// called.

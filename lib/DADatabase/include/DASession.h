@@ -2,6 +2,7 @@
 #define DASESSION_H
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 
 #include "DAAddColumnRequest.h"
@@ -15,9 +16,11 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DARow.h"
 #include "DASearchIndexRequest.h"
 #include "DASearchRequest.h"
 #include "DASelectRequest.h"
+#include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
@@ -49,11 +52,16 @@ struct DASessionState;
 /// the setters wait for the operations in progress and hold off new ones.
 ///
 /// Between a session and other connections (per-call visits of DADatabase,
-/// other sessions, other processes) the busy-retry rule of DADatabase holds
-/// unchanged; no busy handler is set. Its own readers never make a read
-/// wait; rarely, a reader that meets the log's index being rewritten holds
-/// the write lock for an instant, and a write starting then pauses once
-/// under that rule. Per-call visits of a file a session holds with
+/// other sessions, other processes) a session waits in short steps: an
+/// operation that meets another connection's lock logs one warning "SQLITE
+/// BUSY[1]" when the wait begins and retries every millisecond, so it goes
+/// on within a few milliseconds of the lock's release; after the busy-retry
+/// rule's whole pause (1.5 s) it logs "RETRY COUNT is reached LIMIT,
+/// SQLITE_BUSY", makes one last attempt and returns its code (5 if still
+/// busy), as DADatabase does. No busy handler is set. Its own readers never
+/// make a read wait; rarely, a reader that meets the log's index being
+/// rewritten holds the write lock for an instant, and a write starting then
+/// waits that instant. Per-call visits of a file a session holds with
 /// the log see every committed row. Close checkpoints the log into the file
 /// and removes it when no other connection has the file open (else the last
 /// one to close does); the file stays in WAL mode, which any SQLite program
@@ -117,9 +125,14 @@ public:
     /// log needs room), and Close leaves the log for the next opener; the
     /// file keeps every acknowledged row. Set a budget below the free space
     /// where the disk may fill, so that deletes keep working.
+    ///
+    /// SetCreate (default true): false makes Open of a missing file fail
+    /// with 14 and Open's failure line, creating nothing, so that a
+    /// misspelled name does not make an empty file.
     void SetWal(bool wal);
     void SetSyncOnCommit(bool sync);
     void SetSizeLimit(std::int64_t bytes);
+    void SetCreate(bool create);
     ///@}
 
     /// Opens location's file (creating a missing file) under busy-retry, with
@@ -154,7 +167,19 @@ public:
     int Select(DASelectRequest& request, DACursor& cursor);
     int JoinSelect(DAJoinRequest& request, DACursor& cursor);
     int Query(DAQueryRequest& request, DACursor& cursor);
+    int Query(DAQueryRequest& request, DATypedCursor& cursor);
     ///@}
+
+    /// DADatabase::QueryEach on the session's file (a read: a reader
+    /// connection with the log, the writer without it). An exception from
+    /// visit passes through after the statement is reset and the connection
+    /// returned. From visit, on the reading thread, the session's reads
+    /// run; with the log its writes run too (the read keeps seeing the rows
+    /// as they were when it began). Without the log the read holds the one
+    /// connection, and any operation from visit is refused with 21 and the
+    /// error line "SESSION BUSY ON THIS THREAD". Open, Close and the setters
+    /// must not be called from visit: they wait for the read to end.
+    int QueryEach(DAQueryRequest& request, std::function<bool(DARow const&)> const& visit);
 
     /// exists: whether a table named exactly tableName exists in the
     /// session's file. A null tableName throws std::logic_error.
@@ -169,6 +194,7 @@ public:
     int AddColumn(DAAddColumnRequest& request);
     int GetVersion(int& version);
     int Migrate(DABatchRequest& step, int version);
+    int Migrate(DABatchRequest& step, int version, bool& applied);
     int GetSpace(std::int64_t& fileBytes, std::int64_t& freeBytes);
     int Compact();
     ///@}
@@ -188,7 +214,12 @@ public:
     int CreateSearchIndex(DASearchIndexRequest& request);
     int DropSearchIndex(char const* name);
     int Search(DASearchRequest& request, DACursor& cursor);
+    int Search(DASearchRequest& request, DATypedCursor& cursor);
     ///@}
+
+    /// DADatabase::Unwatch at the session's file: codes and lines as stated
+    /// there.
+    int Unwatch(char const* table);
 
 private:
     std::unique_ptr<DASessionState> m_state;

@@ -69,7 +69,10 @@ public:
     /// "SELECT  * FROM l INNER JOIN r ON l.lc = r.rc[ WHERE ...]"
     void GetJoinSql(DAJoinRequest& request, std::string& sql);
 
-    /// "INSERT OR REPLACE INTO t (a, b) VALUES ('1', '2')"
+    /// "INSERT OR REPLACE INTO t (a, b) VALUES ('1', '2')"; typed values
+    /// (DABaseSet::SetNull, SetBlob) follow the data map's columns in call
+    /// order: "INSERT OR REPLACE INTO t (a, p, e) VALUES ('1', X'89504E47',
+    /// NULL)". The same for GetInsertSql and GetUpdateSql ("SET e = NULL").
     void GetUpsertSql(DAUpsertRequest& request, std::string& sql);
 
     /// "UPDATE t SET a = '1', b = '2' WHERE c='3'" (" WHERE " always written)

@@ -116,6 +116,18 @@ int DADatabase::Query(DAQueryRequest& request, DACursor& cursor)
     return DAOperations::Query(visit, request, cursor);
 }
 
+int DADatabase::Query(DAQueryRequest& request, DATypedCursor& cursor)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Query(visit, request, cursor);
+}
+
+int DADatabase::QueryEach(DAQueryRequest& request, std::function<bool(DARow const&)> const& visit)
+{
+    DAVisit source(*this, __LINE__);
+    return DAOperations::QueryEach(source, request, visit);
+}
+
 int DADatabase::CheckExistTable(DABasePath& location, char const* tableName, bool& exists)
 {
     DAVisit visit(*this, __LINE__);
@@ -143,7 +155,14 @@ int DADatabase::GetVersion(DABasePath& location, int& version)
 int DADatabase::Migrate(DABatchRequest& step, int version)
 {
     DAVisit visit(*this, __LINE__);
-    return DAOperations::Migrate(visit, step, version);
+    bool applied = false;
+    return DAOperations::Migrate(visit, step, version, applied);
+}
+
+int DADatabase::Migrate(DABatchRequest& step, int version, bool& applied)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Migrate(visit, step, version, applied);
 }
 
 int DADatabase::GetSpace(DABasePath& location, std::int64_t& fileBytes, std::int64_t& freeBytes)
@@ -192,4 +211,16 @@ int DADatabase::Search(DASearchRequest& request, DACursor& cursor)
 {
     DAVisit visit(*this, __LINE__);
     return DAOperations::Search(visit, request, cursor);
+}
+
+int DADatabase::Search(DASearchRequest& request, DATypedCursor& cursor)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Search(visit, request, cursor);
+}
+
+int DADatabase::Unwatch(DABasePath& location, char const* table)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Unwatch(visit, location, table);
 }

@@ -6,6 +6,7 @@
 #include "DABusyRetry.h"
 #include "DALog.h"
 #include "DAParseRows.h"
+#include "DAStepRows.h"
 
 namespace {
 
@@ -70,17 +71,57 @@ int DADatabaseParser::ParseRows(sqlite3* db, sqlite3_stmt* stmt, DACursor& curso
 int DAParseRows(DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, DACursor& cursor, std::string& failure,
                 bool mayBeStale)
 {
-    const char* const func = "ParseDatabase";
-    DABusyRetry<DADatabaseParser> retry(parser);
-    bool first = true;  // until the first step that was not busy
-    bool registered = false;
-    int columnCount = 0;
-    int failed = SQLITE_OK;  // the failed step's code, once known
     // The column names, copied once from the first row: SQLite's name of a
     // column does not change while a statement prepared by sqlite3_prepare
     // runs, and asking for it again for every value costs a lock of the
     // connection's mutex each time.
-    std::vector<std::string> names;
+    struct Rows {
+        DACursor& cursor;
+        std::vector<std::string> names;
+        bool registered;
+    } rows{cursor, {}, false};
+    const auto start = [](void* user) { static_cast<Rows*>(user)->cursor.Initialize(); };
+    return DAStepRows(parser, db, stmt, failure, &rows, mayBeStale, start, [](void* user, sqlite3_stmt* row) {
+        const char* const func = "ParseDatabase";
+        Rows& to = *static_cast<Rows*>(user);
+        if (!to.registered) {
+            const int columnCount = sqlite3_column_count(row);
+            to.names.reserve(static_cast<std::size_t>(columnCount));
+            for (int i = 0; i < columnCount; ++i) {
+                to.names.emplace_back(TextOrEmpty(sqlite3_column_name(row, i)));
+                to.cursor.SetColumn(to.names.back().c_str());
+            }
+            to.registered = true;
+        }
+        const auto columnCount = static_cast<int>(to.names.size());
+        for (int i = 0; i < columnCount; ++i) {
+            const char* name = to.names[static_cast<std::size_t>(i)].c_str();
+            switch (sqlite3_column_type(row, i)) {
+            case SQLITE_INTEGER:
+            case SQLITE_FLOAT:
+            case SQLITE_TEXT:
+                to.cursor.SetData(name, TextOrEmpty(sqlite3_column_text(row, i)));
+                break;
+            case SQLITE_NULL:
+                to.cursor.SetData(name, "");
+                break;
+            default:
+                DA_LOG_AT(DLOG_ERROR, func, "UNKNOWN TYPE");
+                to.cursor.SetData(name, "");
+                break;
+            }
+        }
+        return SQLITE_ROW;
+    });
+}
+
+int DAStepRows(DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, void* user,
+               bool mayBeStale, void (*onStart)(void* user), DARowSink onRow)
+{
+    const char* const func = "ParseDatabase";
+    DABusyRetry<DADatabaseParser> retry(parser);
+    bool first = true;  // until the first step that was not busy
+    int failed = SQLITE_OK;  // the failed step's code, once known
     for (;;) {
         const int rc = sqlite3_step(stmt);
         if (first && (rc != SQLITE_BUSY || retry.Stopped())) {
@@ -90,7 +131,7 @@ int DAParseRows(DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, DACur
             if (mayBeStale && rc != SQLITE_ROW && rc != SQLITE_DONE && sqlite3_expired(stmt) != 0) {
                 return kDAStaleStatement;
             }
-            cursor.Initialize();
+            onStart(user);
         }
         if (rc == SQLITE_DONE && failed == SQLITE_OK) {
             return rc;
@@ -115,31 +156,12 @@ int DAParseRows(DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, DACur
             retry.Stop();
             continue;
         }
-        if (!registered) {
-            columnCount = sqlite3_column_count(stmt);
-            names.reserve(static_cast<std::size_t>(columnCount));
-            for (int i = 0; i < columnCount; ++i) {
-                names.emplace_back(TextOrEmpty(sqlite3_column_name(stmt, i)));
-                cursor.SetColumn(names.back().c_str());
+        const int next = onRow(user, stmt);
+        if (next != SQLITE_ROW) {
+            if (next != SQLITE_DONE) {
+                failure = sqlite3_errstr(next);
             }
-            registered = true;
-        }
-        for (int i = 0; i < columnCount; ++i) {
-            const char* name = names[static_cast<std::size_t>(i)].c_str();
-            switch (sqlite3_column_type(stmt, i)) {
-            case SQLITE_INTEGER:
-            case SQLITE_FLOAT:
-            case SQLITE_TEXT:
-                cursor.SetData(name, TextOrEmpty(sqlite3_column_text(stmt, i)));
-                break;
-            case SQLITE_NULL:
-                cursor.SetData(name, "");
-                break;
-            default:
-                DA_LOG_AT(DLOG_ERROR, func, "UNKNOWN TYPE");
-                cursor.SetData(name, "");
-                break;
-            }
+            return next;
         }
     }
 }

@@ -6,6 +6,7 @@
 #include <cstring>
 #include <stdexcept>
 #include <string>
+#include <vector>
 
 #include "DABusyRetry.h"
 #include "DADatabaseParser.h"
@@ -14,6 +15,9 @@
 #include "DAPlainName.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
+#include "DAStepRows.h"
+#include "DATypedStore.h"
+#include "DAWatchSchema.h"
 
 void DALeaseEnd::operator()(sqlite3* db) const noexcept
 {
@@ -122,19 +126,19 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
     return rc;
 }
 
-// A query whose rows fill cursor; step failures are logged by the parser,
-// and returned (with the line "<word> FAILED[rc]: text") when
+// A query whose rows rows(parser, db, stmt, failure, mayBeStale) reads, returning
+// SQLITE_DONE when it read them all; step failures are logged by the
+// parser, and returned (with the line "<word> FAILED[rc]: text") when
 // returnStepFailure.
-template <typename Request>
-int RunCursorQuery(DAConnectionSource& source, Request& request,
-                   void (DASqlGenerator::*generate)(Request&, std::string&), DACursor& cursor, const char* func,
-                   const char* word, bool logOpenFailure, bool returnStepFailure = false)
+template <typename Request, typename Rows>
+int RunRowsQuery(DAConnectionSource& source, Request& request, void (DASqlGenerator::*generate)(Request&, std::string&),
+                 const char* func, const char* word, bool logOpenFailure, bool returnStepFailure, Rows rows)
 {
     return RunQuery(
         source, request, [&](std::string& sql) { (DASqlGenerator().*generate)(request, sql); },
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, bool mayBeStale) {
             std::string failure;
-            const int rc = DAParseRows(parser, db, stmt, cursor, failure, mayBeStale);
+            const int rc = rows(parser, db, stmt, failure, mayBeStale);
             if (rc == SQLITE_DONE || (rc != kDAStaleStatement && !returnStepFailure)) {
                 return SQLITE_OK;
             }
@@ -145,6 +149,38 @@ int RunCursorQuery(DAConnectionSource& source, Request& request,
             return rc;
         },
         func, word, logOpenFailure);
+}
+
+// A query whose rows fill cursor.
+template <typename Request>
+int RunCursorQuery(DAConnectionSource& source, Request& request,
+                   void (DASqlGenerator::*generate)(Request&, std::string&), DACursor& cursor, const char* func,
+                   const char* word, bool logOpenFailure, bool returnStepFailure = false)
+{
+    return RunRowsQuery(source, request, generate, func, word, logOpenFailure, returnStepFailure,
+                        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure,
+                            bool mayBeStale) { return DAParseRows(parser, db, stmt, cursor, failure, mayBeStale); });
+}
+
+// The typed reads' rows: Query's into a whole store, QueryEach's one at a
+// time into a store whose buffers every row reuses.
+struct EachRow {
+    DATypedStore& store;
+    const std::function<bool(DARow const&)>& visit;
+};
+
+int AppendRow(void* store, sqlite3_stmt* stmt)
+{
+    return static_cast<DATypedStore*>(store)->Append(stmt);
+}
+
+int VisitRow(void* user, sqlite3_stmt* stmt)
+{
+    auto& each = *static_cast<EachRow*>(user);
+    each.store.Clear(true);
+    const int rc = each.store.Append(stmt);
+    each.store.position = 0;
+    return rc != SQLITE_ROW ? rc : each.visit(each.store.row) ? SQLITE_ROW : SQLITE_DONE;
 }
 
 // The transaction core of batches and migrations, on a held connection:
@@ -176,9 +212,13 @@ private:
     sqlite3* m_db;
 };
 
-template <typename Decide, typename Finish>
+struct NoStatementFollowUp {
+    void operator()(int /*step*/) const {}
+};
+
+template <typename Decide, typename Finish, typename After = NoStatementFollowUp>
 int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, int count, DAErrorText& error, int& step,
-                   Decide decide, Finish finish)
+                   Decide decide, Finish finish, After after = After())
 {
     const DARollbackGuard rollback(db);
     // IMMEDIATE takes the write lock now, so a busy file shows (and is
@@ -192,6 +232,9 @@ int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, i
     while (rc == SQLITE_OK && step < count) {
         ++step;
         rc = source.Execute(db, sql, error);
+        if (rc == SQLITE_OK) {
+            after(step);
+        }
         sql += std::strlen(sql) + 1;
     }
     if (rc == SQLITE_OK) {
@@ -273,6 +316,51 @@ int RunScript(DAConnectionSource& source, DABasePath& location, const std::strin
 
 const char* const kReadVersion = "PRAGMA user_version";
 
+// Refuses a table name that is not plain, with the line "<func>
+// FAILED[21]: table name is not a plain name".
+bool IsWatchableName(DAConnectionSource& source, char const* table, const char* func)
+{
+    if (DAIsPlainName(table)) {
+        return true;
+    }
+    DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: table name is not a plain name", func,
+                 SQLITE_MISUSE);
+    return false;
+}
+
+// Appends sql and its terminating NUL to texts (the form RunTransaction
+// takes).
+void AddText(std::string& texts, const std::string& sql)
+{
+    texts += sql;
+    texts += '\0';
+}
+
+// A transaction of count texts with finish, logged "<func> SUCCESS[0]" or
+// "<func> FAILED[rc]: text" under func.
+template <typename Finish>
+int RunWatchTransaction(DAConnectionSource& source, DABasePath& location, const char* func, const std::string& texts,
+                        int count, Finish finish)
+{
+    DALease db;
+    int rc = source.Acquire(location, DAAccess::Write, func, db);
+    if (rc != SQLITE_OK) {
+        return rc;
+    }
+    DAErrorText error;
+    int step = 0;
+    rc = RunTransaction(
+        source, db.get(), texts.data(), count, error, step, [] { return SQLITE_OK; },
+        [&] { return finish(db.get(), error); });
+    if (rc == SQLITE_OK) {
+        DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "%s SUCCESS[%d]", func, rc);
+    } else {
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", func, rc,
+                     FailureText(error, rc));
+    }
+    return rc;
+}
+
 }  // namespace
 
 int DAConnectionSource::Prepare(sqlite3* db, const char* sql, DAStatementLease& stmt)
@@ -324,6 +412,7 @@ int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch
 {
     const char* const func = "ExecuteBatch";
     const int count = batch.m_count;
+    batch.m_rowIds.clear();
     if (count == 0) {
         return SQLITE_OK;
     }
@@ -336,6 +425,8 @@ int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch
     int step = 0;
     int before = 0;
     int changes = 0;
+    std::vector<std::int64_t> ids;
+    ids.reserve(batch.m_inserts.size());
     rc = RunTransaction(
         source, db.get(), batch.m_texts.data(), count, error, step,
         [&] {
@@ -345,9 +436,17 @@ int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch
         [&] {
             changes = sqlite3_total_changes(db.get()) - before;
             return SQLITE_OK;
+        },
+        [&](int at) {
+            // An ignored row changes nothing, and then the last row id is
+            // another statement's.
+            if (ids.size() < batch.m_inserts.size() && batch.m_inserts[ids.size()] == at) {
+                ids.push_back(sqlite3_changes(db.get()) > 0 ? sqlite3_last_insert_rowid(db.get()) : -1);
+            }
         });
     if (rc == SQLITE_OK) {
         batch.m_changes = changes;
+        batch.m_rowIds = std::move(ids);
         DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "ExecuteBatch SUCCESS[%d]: %d statements", rc,
                      count);
         return rc;
@@ -370,6 +469,45 @@ int DAOperations::JoinSelect(DAConnectionSource& source, DAJoinRequest& request,
 int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DACursor& cursor)
 {
     return RunCursorQuery(source, request, &DASqlGenerator::GetQuerySql, cursor, "Query", "QUERY", true, true);
+}
+
+int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DATypedCursor& cursor)
+{
+    return TypedQuery(source, request, &DASqlGenerator::GetQuerySql, cursor, "Query", "QUERY");
+}
+
+template <typename Request>
+int DAOperations::TypedQuery(DAConnectionSource& source, Request& request,
+                             void (DASqlGenerator::*generate)(Request&, std::string&), DATypedCursor& cursor,
+                             const char* func, const char* word)
+{
+    return RunRowsQuery(
+        source, request, generate, func, word, true, true,
+        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, bool mayBeStale) {
+            if (cursor.m_store == nullptr) {  // moved from
+                cursor.m_store = std::make_unique<DATypedStore>();
+            }
+            DATypedStore& store = *cursor.m_store;
+            const auto start = [](void* user) { static_cast<DATypedStore*>(user)->Clear(false); };
+            const int rc = DAStepRows(parser, db, stmt, failure, &store, mayBeStale, start, AppendRow);
+            if (rc != kDAStaleStatement && store.rows == 0) {
+                store.TakeNames(stmt);
+            }
+            return rc;
+        });
+}
+
+int DAOperations::QueryEach(DAConnectionSource& source, DAQueryRequest& request,
+                            const std::function<bool(DARow const&)>& visit)
+{
+    return RunRowsQuery(
+        source, request, &DASqlGenerator::GetQuerySql, "QueryEach", "QUERY", true, true,
+        [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, bool mayBeStale) {
+            DATypedStore store;
+            EachRow each{store, visit};
+            return DAStepRows(
+                parser, db, stmt, failure, &each, mayBeStale, [](void* /*user*/) {}, VisitRow);
+        });
 }
 
 int DAOperations::CheckExistTable(DAConnectionSource& source, DABasePath& location, char const* tableName, bool& exists)
@@ -411,9 +549,10 @@ int DAOperations::GetVersion(DAConnectionSource& source, DABasePath& location, i
     return rc;
 }
 
-int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int version)
+int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int version, bool& applied)
 {
     const char* const func = "Migrate";
+    applied = false;
     if (version <= 0) {
         DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(),
                      "Migrate FAILED[%d]: step for version %d, versions start at 1", SQLITE_MISUSE, version);
@@ -449,6 +588,7 @@ int DAOperations::Migrate(DAConnectionSource& source, DABatchRequest& step, int 
             },
             [&] { return ExecWhileBusy(source, db.get(), setVersion.c_str(), error); });
         if (rc == SQLITE_OK) {
+            applied = true;
             DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "Migrate SUCCESS[%d]: version %d", rc, version);
             return rc;
         }
@@ -531,4 +671,73 @@ int DAOperations::DropSearchIndex(DAConnectionSource& source, DABasePath& locati
 int DAOperations::Search(DAConnectionSource& source, DASearchRequest& request, DACursor& cursor)
 {
     return RunCursorQuery(source, request, &DASqlGenerator::GetSearchSql, cursor, "Search", "SEARCH", true, true);
+}
+
+int DAOperations::Search(DAConnectionSource& source, DASearchRequest& request, DATypedCursor& cursor)
+{
+    return TypedQuery(source, request, &DASqlGenerator::GetSearchSql, cursor, "Search", "SEARCH");
+}
+
+int DAOperations::Watch(DAConnectionSource& source, DABasePath& location, char const* table, std::int64_t& changes,
+                        std::int64_t& schema)
+{
+    const char* const func = "AddTable";
+    if (!IsWatchableName(source, table, func)) {
+        return SQLITE_MISUSE;
+    }
+    // Names are plain, so they need no quoting inside the literals.
+    const std::string counters = std::string("\"") + kDAWatchTable + "\"";
+    const std::string name = std::string("'") + table + "'";
+    std::string texts;
+    AddText(texts,
+            "CREATE TABLE IF NOT EXISTS " + counters +
+                "(name TEXT PRIMARY KEY COLLATE NOCASE, changes INTEGER NOT NULL) WITHOUT ROWID");
+    AddText(texts, "INSERT OR IGNORE INTO " + counters + " VALUES(" + name + ", 0)");
+    for (const char* event : kDAWatchEvents) {
+        std::string trigger = "CREATE TRIGGER IF NOT EXISTS \"" + DAWatchTrigger(table, event);
+        trigger.append("\" AFTER ").append(event).append(" ON ").append(table);
+        trigger.append(" BEGIN UPDATE ").append(counters).append(" SET changes = changes + 1 WHERE name = ");
+        AddText(texts, trigger.append(name).append("; END"));
+    }
+    const std::string read =
+        "SELECT changes, (SELECT schema_version FROM pragma_schema_version) FROM " + counters + " WHERE name = " + name;
+    std::array<std::int64_t, 2> values{};
+    const int rc = RunWatchTransaction(source, location, func, texts, 5, [&](sqlite3* db, DAErrorText& error) {
+        return ReadIntegers(source, db, read.c_str(), values, error);
+    });
+    if (rc == SQLITE_OK) {
+        changes = values[0];
+        schema = values[1];
+    }
+    return rc;
+}
+
+int DAOperations::Unwatch(DAConnectionSource& source, DABasePath& location, char const* table)
+{
+    const char* const func = "Unwatch";
+    if (!IsWatchableName(source, table, func)) {
+        return SQLITE_MISUSE;
+    }
+    const std::string counters = std::string("\"") + kDAWatchTable + "\"";
+    std::string texts;
+    for (const char* event : kDAWatchEvents) {
+        AddText(texts, "DROP TRIGGER IF EXISTS \"" + DAWatchTrigger(table, event) + "\"");
+    }
+    const std::string present =
+        std::string("SELECT count(*) FROM sqlite_master WHERE type = 'table' AND name = '") + kDAWatchTable + "'";
+    const std::string forget = "DELETE FROM " + counters + " WHERE name = '" + table + "'";
+    const std::string left = "SELECT count(*) FROM " + counters;
+    const std::string drop = "DROP TABLE " + counters;
+    return RunWatchTransaction(source, location, func, texts, 3, [&](sqlite3* db, DAErrorText& error) {
+        std::array<std::int64_t, 1> count{};
+        int rc = ReadIntegers(source, db, present.c_str(), count, error);
+        if (rc != SQLITE_OK || count[0] == 0) {
+            return rc;
+        }
+        rc = ExecWhileBusy(source, db, forget.c_str(), error);
+        if (rc == SQLITE_OK) {
+            rc = ReadIntegers(source, db, left.c_str(), count, error);
+        }
+        return rc == SQLITE_OK && count[0] == 0 ? ExecWhileBusy(source, db, drop.c_str(), error) : rc;
+    });
 }

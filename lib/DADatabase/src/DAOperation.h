@@ -7,6 +7,7 @@
 // DAConnectionSource.
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <string>
 
@@ -23,14 +24,17 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DARow.h"
 #include "DASearchIndexRequest.h"
 #include "DASearchRequest.h"
 #include "DASelectRequest.h"
 #include "DASqliteHandles.h"
+#include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
 class DAConnectionSource;
+class DASqlGenerator;
 
 // Ends a lease: a per-call visit closes the connection, a session takes it
 // back (and lets the next writer in).
@@ -117,11 +121,14 @@ struct DAOperations {
     static int Select(DAConnectionSource& source, DASelectRequest& request, DACursor& cursor);
     static int JoinSelect(DAConnectionSource& source, DAJoinRequest& request, DACursor& cursor);
     static int Query(DAConnectionSource& source, DAQueryRequest& request, DACursor& cursor);
+    static int Query(DAConnectionSource& source, DAQueryRequest& request, DATypedCursor& cursor);
+    static int QueryEach(DAConnectionSource& source, DAQueryRequest& request,
+                         const std::function<bool(DARow const&)>& visit);
     static int CheckExistTable(DAConnectionSource& source, DABasePath& location, char const* tableName, bool& exists);
     static int CreateIndex(DAConnectionSource& source, DACreateIndexRequest& request);
     static int AddColumn(DAConnectionSource& source, DAAddColumnRequest& request);
     static int GetVersion(DAConnectionSource& source, DABasePath& location, int& version);
-    static int Migrate(DAConnectionSource& source, DABatchRequest& step, int version);
+    static int Migrate(DAConnectionSource& source, DABatchRequest& step, int version, bool& applied);
     static int GetSpace(DAConnectionSource& source, DABasePath& location, std::int64_t& fileBytes,
                         std::int64_t& freeBytes);
     static int Compact(DAConnectionSource& source, DABasePath& location);
@@ -131,6 +138,25 @@ struct DAOperations {
     static int CreateSearchIndex(DAConnectionSource& source, DASearchIndexRequest& request);
     static int DropSearchIndex(DAConnectionSource& source, DABasePath& location, char const* name);
     static int Search(DAConnectionSource& source, DASearchRequest& request, DACursor& cursor);
+    static int Search(DAConnectionSource& source, DASearchRequest& request, DATypedCursor& cursor);
+
+    // A query whose rows fill a typed cursor, in Query's frame, under func
+    // and word: the typed Query and Search.
+    template <typename Request>
+    static int TypedQuery(DAConnectionSource& source, Request& request,
+                          void (DASqlGenerator::*generate)(Request&, std::string&), DATypedCursor& cursor,
+                          const char* func, const char* word);
+
+    // Installs, under the write lock, what watching table needs in the file
+    // (DAWatchSchema.h; kept if there): 0 with changes and schema the
+    // table's counter and the file's schema version at that commit, else
+    // the code. Lines "AddTable SUCCESS[0]" / "AddTable FAILED[rc]: text";
+    // a name that is not plain is refused with 21 and one line.
+    static int Watch(DAConnectionSource& source, DABasePath& location, char const* table, std::int64_t& changes,
+                     std::int64_t& schema);
+    // Removes table's triggers and counter, and the counter table with the
+    // last counter: contract in DADatabase.h (Unwatch).
+    static int Unwatch(DAConnectionSource& source, DABasePath& location, char const* table);
 };
 
 #endif  // DAOPERATION_H

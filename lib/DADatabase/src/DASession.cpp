@@ -46,6 +46,7 @@ struct DASessionState {
     mutable std::shared_mutex life;
     bool wal = true;
     bool sync = true;
+    bool create = true;
     std::int64_t sizeLimit = 0;
 
     DABasePath location;
@@ -67,6 +68,9 @@ struct DASessionState {
 
 namespace {
 
+// The session whose writer this thread holds, if any.
+thread_local const DASessionState* t_writerHeld = nullptr;
+
 // The session's connection source, one per operation (on its stack).
 class DASessionSource : public DAConnectionSource {
 public:
@@ -83,7 +87,14 @@ public:
             return rc;
         }
         if (access == DAAccess::Write || !m_state.walActive) {
+            // Only a visit of this thread's own read can get here holding
+            // the writer: locking again would never return.
+            if (t_writerHeld == &m_state) {
+                DA_LOG_WHERE(DLOG_ERROR, File(), func, Line(), "SESSION BUSY ON THIS THREAD");
+                return SQLITE_MISUSE;
+            }
             m_state.writeMutex.lock();
+            t_writerHeld = &m_state;
             lease = DALease(m_state.writer.get(), DALeaseEnd{this});
             return SQLITE_OK;
         }
@@ -111,6 +122,7 @@ public:
             if (std::exchange(m_state.touched, false)) {
                 ++m_state.generation;
             }
+            t_writerHeld = nullptr;
             m_state.writeMutex.unlock();
             return;
         }
@@ -135,7 +147,10 @@ public:
         reader.generation = generation;
     }
 
-    bool IsRetryLimit(int& count) override { return DAIsRetryLimit(count, DA_FILE_NAME, __LINE__); }
+    // Waits for other connections in short steps (DAShortBusyWait): a held
+    // connection's write goes on within a couple of milliseconds of the
+    // other's commit, not after a 100 ms pause.
+    bool IsRetryLimit(int& count) override { return m_busy.IsRetryLimit(count, DA_FILE_NAME, __LINE__); }
 
     // Held connections outlive other connections' schema changes.
     bool MayBeStale() const override { return true; }
@@ -269,14 +284,29 @@ private:
         for (std::size_t i = 0; rc == SQLITE_OK && i < m_values.size(); ++i) {
             const DALiteral& value = m_values[i];
             const int index = static_cast<int>(i + 1);
-            rc = value.integer ? sqlite3_bind_int64(handle, index, std::strtoll(value.text.c_str(), nullptr, 10))
-                               : sqlite3_bind_text(handle, index, value.text.data(),
-                                                   static_cast<int>(value.text.size()), SQLITE_STATIC);
+            rc = Bind(handle, index, value);
         }
         return rc;
     }
 
+    static int Bind(sqlite3_stmt* stmt, int index, const DALiteral& value)
+    {
+        const auto size = static_cast<sqlite3_uint64>(value.text.size());
+        switch (value.kind) {
+        case DALiteral::Kind::Integer:
+            return sqlite3_bind_int64(stmt, index, std::strtoll(value.text.c_str(), nullptr, 10));
+        case DALiteral::Kind::Null:
+            return sqlite3_bind_null(stmt, index);
+        case DALiteral::Kind::Blob:
+            return sqlite3_bind_blob64(stmt, index, value.text.data(), size, SQLITE_STATIC);
+        case DALiteral::Kind::Text:
+            break;
+        }
+        return sqlite3_bind_text64(stmt, index, value.text.data(), size, SQLITE_STATIC, SQLITE_UTF8);
+    }
+
     DASessionState& m_state;
+    DAShortBusyWait m_busy;
     DAReader m_reader;  // the one this operation holds, if any
     std::string m_scratch[4];
     std::string m_shape;  // the shape and literals of the last text split
@@ -343,6 +373,12 @@ void DASession::SetSyncOnCommit(bool sync)
     m_state->sync = sync;
 }
 
+void DASession::SetCreate(bool create)
+{
+    const std::unique_lock<std::shared_mutex> life(m_state->life);
+    m_state->create = create;
+}
+
 void DASession::SetSizeLimit(std::int64_t bytes)
 {
     const std::unique_lock<std::shared_mutex> life(m_state->life);
@@ -365,7 +401,8 @@ int DASession::Open(DABasePath& location)
 
     DASessionSource source(state, __LINE__);
     DAConnection writer;
-    int rc = source.OpenConnection(state.path, kWriterFlags, func, writer);
+    int rc = source.OpenConnection(state.path, state.create ? kWriterFlags : kWriterFlags & ~SQLITE_OPEN_CREATE, func,
+                                   writer);
     if (rc != SQLITE_OK) {
         return rc;
     }
@@ -484,6 +521,18 @@ int DASession::Query(DAQueryRequest& request, DACursor& cursor)
     return DAOperations::Query(source, request, cursor);
 }
 
+int DASession::Query(DAQueryRequest& request, DATypedCursor& cursor)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::Query(source, request, cursor);
+}
+
+int DASession::QueryEach(DAQueryRequest& request, std::function<bool(DARow const&)> const& visit)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::QueryEach(source, request, visit);
+}
+
 int DASession::CheckExistTable(char const* tableName, bool& exists)
 {
     DASessionCall source(*m_state, __LINE__);
@@ -513,7 +562,14 @@ int DASession::GetVersion(int& version)
 int DASession::Migrate(DABatchRequest& step, int version)
 {
     DASessionCall source(*m_state, __LINE__);
-    return DAOperations::Migrate(source, step, version);
+    bool applied = false;
+    return DAOperations::Migrate(source, step, version, applied);
+}
+
+int DASession::Migrate(DABatchRequest& step, int version, bool& applied)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::Migrate(source, step, version, applied);
 }
 
 int DASession::GetSpace(std::int64_t& fileBytes, std::int64_t& freeBytes)
@@ -567,4 +623,17 @@ int DASession::Search(DASearchRequest& request, DACursor& cursor)
 {
     DASessionCall source(*m_state, __LINE__);
     return DAOperations::Search(source, request, cursor);
+}
+
+int DASession::Search(DASearchRequest& request, DATypedCursor& cursor)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::Search(source, request, cursor);
+}
+
+int DASession::Unwatch(char const* table)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    return DAOperations::Unwatch(source, here, table);
 }

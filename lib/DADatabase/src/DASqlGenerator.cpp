@@ -1,9 +1,12 @@
 #include "DASqlGenerator.h"
 
 #include <algorithm>
+#include <cstdint>
 #include <cstring>
 #include <utility>
 #include <vector>
+
+#include "DASqlLiteral.h"
 
 namespace {
 
@@ -18,24 +21,41 @@ void CutAtLast(std::string& text, const char* separator)
     }
 }
 
-// Appends value as an SQL text literal, doubling any single quote in it.
 void AppendLiteral(std::string& sql, const std::string& value)
 {
-    sql += '\'';
-    for (const char c : value) {
-        if (c == '\'') {
-            sql += '\'';
-        }
-        sql += c;
+    DAAppendTextLiteral(sql, value);
+}
+
+// A typed value of the data part as it stands in SQL: NULL, a blob, or an
+// increment's delta (its value on insert).
+void AppendTyped(std::string& sql, const DABaseSet::TypedValue& value)
+{
+    if (value.increment) {
+        sql += std::to_string(value.delta);
+    } else if (value.null) {
+        sql += "NULL";
+    } else {
+        DAAppendBlobLiteral(sql, value.bytes.data(), value.bytes.size());
     }
-    sql += '\'';
+}
+
+// Appends "c = c + 1" ("c = c - 1" for a negative delta; the most
+// negative one stays an integer as "c + -9223372036854775808").
+void AppendIncrement(std::string& sql, const DABaseSet::TypedValue& value)
+{
+    sql.append(value.column).append(" = ").append(value.column);
+    if (value.delta >= 0 || value.delta == INT64_MIN) {
+        sql.append(" + ").append(std::to_string(value.delta));
+    } else {
+        sql.append(" - ").append(std::to_string(-value.delta));
+    }
 }
 
 // Appends one listed condition: "ts<1700000000000", "k IN ('a', 'b')",
 // "v IS NULL".
 void AppendCondition(std::string& sql, const DABaseSet::Condition& condition)
 {
-    static const char* const kOperators[] = {"=", "<>", "<", "<=", ">", ">=", " LIKE "};
+    static const char* const kOperators[] = {"=", "<>", "<", "<=", ">", ">=", " LIKE ", " LIKE ", " LIKE ", " LIKE "};
     sql += condition.column;
     switch (condition.form) {
     case DABaseSet::Condition::Form::Compare:
@@ -45,6 +65,24 @@ void AppendCondition(std::string& sql, const DABaseSet::Condition& condition)
         } else {
             AppendLiteral(sql, condition.values.front());
         }
+        if (condition.op > DACompare::Like) {  // a text match: its pattern escapes with '\'
+            sql += " ESCAPE '\\'";
+        }
+        break;
+    case DABaseSet::Condition::Form::Row:
+        sql += '(';
+        for (const std::string& column : condition.columns) {
+            sql += column + ", ";
+        }
+        sql.resize(sql.size() - 2);
+        sql += ")";
+        sql += kOperators[static_cast<int>(condition.op)];
+        sql += '(';
+        for (const std::string& value : condition.values) {
+            sql += value + ", ";
+        }
+        sql.resize(sql.size() - 2);
+        sql += ')';
         break;
     case DABaseSet::Condition::Form::In:
         sql += " IN (";
@@ -94,12 +132,15 @@ void AppendWhere(std::string& sql, DABaseSet& request, bool always)
     CutAtLast(sql, " AND");
 }
 
-// "<head>t (a, b) VALUES ('1', '2')", the data map in map order: the
-// insert statements' shared shape.
+// "<head>t (a, b) VALUES ('1', '2')", the data map in map order, then the
+// typed values in call order, increments last: the insert statements'
+// shared shape.
 void WriteInsert(const char* head, DABaseSet& request, const std::string& table, std::string& sql)
 {
     DAValueMap data;
+    std::vector<DABaseSet::TypedValue> typed;
     request.GetDataMap(data);
+    request.GetTypedData(typed);
 
     std::string columns = " (";
     std::string values = "VALUES (";
@@ -108,6 +149,17 @@ void WriteInsert(const char* head, DABaseSet& request, const std::string& table,
         columns += ", ";
         AppendLiteral(values, entry.second);
         values += ", ";
+    }
+    // The increments' columns come last, their delta as the value.
+    for (const bool increments : {false, true}) {
+        for (const auto& value : typed) {
+            if (value.increment == increments) {
+                columns += value.column;
+                columns += ", ";
+                AppendTyped(values, value);
+                values += ", ";
+            }
+        }
     }
     CutAtLast(columns, ", ");
     columns += ") ";
@@ -291,22 +343,77 @@ void DASqlGenerator::GetJoinSql(DAJoinRequest& request, std::string& sql)
 void DASqlGenerator::GetUpsertSql(DAUpsertRequest& request, std::string& sql)
 {
     std::string table;
+    std::vector<std::string> keys;
     request.GetTable(table);
-    WriteInsert("INSERT OR REPLACE INTO ", request, table, sql);
+    request.GetConflictKeys(keys);
+    if (keys.empty()) {
+        WriteInsert("INSERT OR REPLACE INTO ", request, table, sql);
+        return;
+    }
+    WriteInsert("INSERT INTO ", request, table, sql);
+    std::string text = " ON CONFLICT(";
+    for (const std::string& key : keys) {
+        text += key + ", ";
+    }
+    text.resize(text.size() - 2);
+    text += ") DO UPDATE SET ";
+    // Every column but the keys takes the new row's value, in the insert's
+    // column order; the increments add to the row there is.
+    DAValueMap data;
+    std::vector<DABaseSet::TypedValue> typed;
+    request.GetDataMap(data);
+    request.GetTypedData(typed);
+    const auto isKey = [&](const char* column) { return std::find(keys.begin(), keys.end(), column) != keys.end(); };
+    const std::size_t bare = text.size();
+    for (const auto& entry : data) {
+        if (!isKey(entry.first)) {
+            text.append(entry.first).append(" = excluded.").append(entry.first).append(", ");
+        }
+    }
+    for (const auto& value : typed) {
+        if (!value.increment && !isKey(value.column)) {
+            text.append(value.column).append(" = excluded.").append(value.column).append(", ");
+        }
+    }
+    for (const auto& value : typed) {
+        if (value.increment) {
+            AppendIncrement(text, value);
+            text += ", ";
+        }
+    }
+    if (text.size() == bare) {  // only keys: the row there is stays as it is
+        text.resize(bare - std::strlen("UPDATE SET "));
+        text += "NOTHING";
+    } else {
+        text.resize(text.size() - 2);
+    }
+    sql += text;
 }
 
 void DASqlGenerator::GetUpdateSql(DAUpdateRequest& request, std::string& sql)
 {
     std::string table;
     DAValueMap data;
+    std::vector<DABaseSet::TypedValue> typed;
     request.GetTable(table);
     request.GetDataMap(data);
+    request.GetTypedData(typed);
 
     std::string text = "UPDATE " + table + " SET ";
     for (const auto& entry : data) {
         text += entry.first;
         text += " = ";
         AppendLiteral(text, entry.second);
+        text += ", ";
+    }
+    for (const auto& value : typed) {
+        if (value.increment) {
+            AppendIncrement(text, value);
+        } else {
+            text += value.column;
+            text += " = ";
+            AppendTyped(text, value);
+        }
         text += ", ";
     }
     CutAtLast(text, ", ");

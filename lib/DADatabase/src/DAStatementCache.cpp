@@ -24,6 +24,40 @@ bool StartsWithDml(const char* sql)
     return false;
 }
 
+int HexDigit(char c)
+{
+    return c >= '0' && c <= '9' ? c - '0' : c >= 'A' && c <= 'F' ? c - 'A' + 10 : -1;
+}
+
+// Reads the blob literal X'..' at c into bytes; returns its end, or null
+// when it is not one (odd or lower-case digits: the text runs as written).
+const char* ReadBlob(const char* c, std::string& bytes)
+{
+    const char* end = c + 2;
+    while (HexDigit(*end) >= 0) {
+        ++end;
+    }
+    if (*end != '\'' || (end - c) % 2 != 0) {
+        return nullptr;
+    }
+    bytes.resize(static_cast<std::size_t>(end - c - 2) / 2);
+    for (std::size_t i = 0; i < bytes.size(); ++i) {
+        bytes[i] = static_cast<char>(HexDigit(c[2 + 2 * i]) * 16 + HexDigit(c[3 + 2 * i]));
+    }
+    return end + 1;
+}
+
+// A NULL where a value stands: after "(", "," or "=" (spaces skipped), not
+// the NULL of "IS NULL".
+bool IsNullValue(const char* c, const std::string& shape)
+{
+    if (std::strncmp(c, "NULL", 4) != 0 || IsNameByte(static_cast<unsigned char>(c[4]))) {
+        return false;
+    }
+    const std::string::size_type before = shape.find_last_not_of(' ');
+    return before != std::string::npos && std::strchr("(,=", shape[before]) != nullptr;
+}
+
 }  // namespace
 
 bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>& values)
@@ -36,7 +70,16 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
     for (const char* c = sql; *c != '\0';) {
         const bool glued = c != sql && (IsNameByte(static_cast<unsigned char>(c[-1])) || c[-1] == '.');
         DALiteral literal;
-        if (*c == '\'') {
+        if (!glued && c[0] == 'X' && c[1] == '\'') {
+            c = ReadBlob(c, literal.text);
+            if (c == nullptr) {
+                return false;
+            }
+            literal.kind = DALiteral::Kind::Blob;
+        } else if (!glued && IsNullValue(c, shape)) {
+            literal.kind = DALiteral::Kind::Null;
+            c += 4;
+        } else if (*c == '\'') {
             if (glued) {  // x'00' is a blob
                 return false;
             }
@@ -52,7 +95,8 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
         } else if (*c >= '0' && *c <= '9' && !glued) {
             // The whole number: digits, a fraction, an exponent.
             const char* end = c + std::strspn(c, "0123456789");
-            literal.integer = *end != '.' && *end != 'e' && *end != 'E';
+            const bool integer = *end != '.' && *end != 'e' && *end != 'E';
+            literal.kind = integer ? DALiteral::Kind::Integer : DALiteral::Kind::Text;
             end += *end == '.' ? 1 + std::strspn(end + 1, "0123456789") : 0;
             if (*end == 'e' || *end == 'E') {
                 ++end;
@@ -62,7 +106,7 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
             literal.text.assign(c, end);
             errno = 0;
             std::strtoll(c, nullptr, 10);
-            if (!literal.integer || errno == ERANGE) {
+            if (!integer || errno == ERANGE) {
                 shape += literal.text;
                 c = end;
                 continue;

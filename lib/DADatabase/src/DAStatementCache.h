@@ -16,21 +16,26 @@
 
 #include "DASqliteHandles.h"
 
-// A literal taken out of a text: a quoted text (quotes undoubled), or an
-// unquoted integer that fits 64 bits, bound as such.
+// A literal taken out of a text: a quoted text (quotes undoubled), an
+// unquoted integer that fits 64 bits, a NULL or an X'..' blob (its bytes in
+// text), each bound as such.
 struct DALiteral {
+    enum class Kind { Text, Integer, Null, Blob };
     std::string text;
-    bool integer = false;
+    Kind kind = Kind::Text;
 };
 
 // Splits the NUL-terminated sql into shape (each literal replaced by ?) and
 // values, for a single SELECT, INSERT, UPDATE or DELETE whose every quote
-// opens a literal. Other numbers (reals, integers beyond 64 bits) stay in
+// opens a literal. NULL is taken out where a value stands (after "(", ","
+// or "="; "IS NULL" stays), and so is X'..' with upper-case hex digits, as
+// the generator writes them. Other numbers (reals, integers beyond 64 bits) stay in
 // the shape, as SQLite's reading of them is not repeated here. Returns
 // false, with shape and values unspecified, for any other text: another
 // statement (schema statements take no parameters), an unterminated
 // literal, a ';', a comment, a quoted name, a parameter of its own, a
-// literal glued to a name (x'00' is a blob), more than 999 literals. Such
+// literal glued to a name (x'00' is a blob, taken
+// out only as X'00'), more than 999 literals. Such
 // texts run as they are.
 bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>& values);
 

@@ -115,3 +115,36 @@ TEST(DABaseSet, ListedConditionsRefuseWhatIsNotPlainAndCopyNames)
 }
 
 }  // namespace
+
+namespace {
+
+// Typed values refuse what listed conditions refuse, and a null blob with a
+// size, with one line each; a blob's bytes are copied at the call.
+TEST(DABaseSet, TypedValuesRefuseBadNamesAndCopyBytes)
+{
+    DABaseSet set;
+    LogCapture log;
+    Strings expected;
+    for (const char* bad : {static_cast<const char*>(nullptr), "", "t.v", "a b"}) {
+        set.SetNull(bad);
+        set.SetBlob(bad, "", 0);
+        expected.push_back(Logged(6, "DABaseSet.cpp", "SetNull", "INVALID COLUMN NAME, VALUE NOT STORED"));
+        expected.push_back(Logged(6, "DABaseSet.cpp", "SetBlob", "INVALID COLUMN NAME, VALUE NOT STORED"));
+    }
+    set.SetBlob("b", nullptr, 1);
+    expected.push_back(Logged(6, "DABaseSet.cpp", "SetBlob", "NULL BLOB, NOT STORED"));
+    std::vector<unsigned char> bytes(256);
+    for (std::size_t i = 0; i < bytes.size(); ++i) {
+        bytes[i] = static_cast<unsigned char>(i);
+    }
+    const std::vector<unsigned char> given = bytes;
+    set.SetBlob("b", bytes.data(), bytes.size());
+    bytes.assign(256, 0);
+    std::vector<DABaseSet::TypedValue> typed;
+    set.GetTypedData(typed);
+    ASSERT_EQ(1U, typed.size());
+    EXPECT_EQ(given, typed[0].bytes);
+    EXPECT_EQ(expected, Described(log));
+}
+
+}  // namespace

@@ -1,5 +1,6 @@
 #include "DABaseSet.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <cmath>
@@ -11,6 +12,7 @@
 #include "DALog.h"
 #include "DAMemberLock.h"
 #include "DAPlainName.h"
+#include "DASqlLiteral.h"
 
 namespace {
 
@@ -92,9 +94,39 @@ std::string NumberText(Integer value)
 
 std::string NumberText(double value)
 {
-    std::array<char, 32> text{};
-    const std::to_chars_result result = std::to_chars(text.data(), text.data() + text.size(), value);
-    return {text.data(), result.ptr};  // 24 characters at most
+    return DANumberText(value);
+}
+
+bool IsTextMatch(DACompare op)
+{
+    return op == DACompare::Contains || op == DACompare::StartsWith || op == DACompare::EndsWith;
+}
+
+// A number compared with a text match is refused: its text would match
+// digits, not the number.
+const char* NumberFailure(DACompare op)
+{
+    return IsTextMatch(op) ? "TEXT MATCH OF A NUMBER, CONDITION NOT STORED" : nullptr;
+}
+
+// SQLite refuses a LIKE pattern longer than this many bytes.
+constexpr std::size_t kLikePatternLimit = 50000;
+
+// The LIKE pattern matching value literally under ESCAPE '\': '%', '_' and
+// '\' escaped, '%' added where the match may extend.
+std::string TextMatchPattern(DACompare op, const char* value)
+{
+    std::string pattern = op == DACompare::StartsWith ? "" : "%";
+    for (const char* c = value; *c != '\0'; ++c) {
+        if (*c == '%' || *c == '_' || *c == '\\') {
+            pattern += '\\';
+        }
+        pattern += *c;
+    }
+    if (op != DACompare::EndsWith) {
+        pattern += '%';
+    }
+    return pattern;
 }
 
 // The checks of every listed condition, in this order: a plain column
@@ -112,17 +144,28 @@ bool Accepted(char const* column, const char* valueFailure, const char* func)
     return true;
 }
 
+bool HasColumn(const std::vector<DABaseSet::TypedValue>& typed, char const* column)
+{
+    return std::any_of(typed.begin(), typed.end(),
+                       [column](const DABaseSet::TypedValue& value) { return value.column == column; });
+}
+
 // The one insertion all the setters make: refuse a null column, then build
-// the text and insert it if the key is new, all under the map's lock.
+// the text and insert it if the key is new, all under the map's lock. A
+// data map's column set already by a typed setter (typed holds them, under
+// the same lock) keeps that value.
 template <typename Value>
-void Store(DAValueMap& map, char const* column, Value value, const char* func)
+void Store(DAValueMap& map, char const* column, Value value, const char* func,
+           const std::vector<DABaseSet::TypedValue>* typed = nullptr)
 {
     if (column == nullptr) {
         DA_LOG_AT(DLOG_ERROR, func, "NULL COLUMN NAME, VALUE NOT STORED");
         return;
     }
     const DAMemberLock lock(&map, DA_FILE_NAME, func, __LINE__);
-    map.emplace(column, ValueText(value));
+    if (typed == nullptr || typed->empty() || !HasColumn(*typed, column)) {
+        map.emplace(column, ValueText(value));
+    }
 }
 
 }  // namespace
@@ -136,22 +179,22 @@ DABaseSet::DABaseSet()
 
 void DABaseSet::SetData(char const* column, char const* value)
 {
-    Store(m_dataMap, column, value, __func__);
+    Store(m_dataMap, column, value, __func__, &m_typed);
 }
 
 void DABaseSet::SetData(char const* column, int value)
 {
-    Store(m_dataMap, column, value, __func__);
+    Store(m_dataMap, column, value, __func__, &m_typed);
 }
 
 void DABaseSet::SetData(char const* column, double value)
 {
-    Store(m_dataMap, column, value, __func__);
+    Store(m_dataMap, column, value, __func__, &m_typed);
 }
 
 void DABaseSet::SetData(char const* column, std::int64_t value)
 {
-    Store(m_dataMap, column, value, __func__);
+    Store(m_dataMap, column, value, __func__, &m_typed);
 }
 
 void DABaseSet::SetWhere(char const* column, char const* value)
@@ -187,7 +230,7 @@ void DABaseSet::GetWhereMap(DAValueMap& out)
 void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::int64_t value)
 {
     if (target == Target::Data) {
-        Store(m_dataMap, column, value, "SetData");
+        Store(m_dataMap, column, value, "SetData", &m_typed);
     } else if (target == Target::Where) {
         Store(m_whereMap, column, value, "SetWhere");
     } else {
@@ -198,10 +241,10 @@ void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::in
 void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::uint64_t value)
 {
     if (target == Target::Data) {
-        Store(m_dataMap, column, value, "SetData");
+        Store(m_dataMap, column, value, "SetData", &m_typed);
     } else if (target == Target::Where) {
         Store(m_whereMap, column, value, "SetWhere");
-    } else if (Accepted(column, nullptr, "SetWhere")) {
+    } else if (Accepted(column, NumberFailure(op), "SetWhere")) {
         AddCondition(column, Condition::Form::Compare, op, {NumberText(value)}, true, "SetWhere");
     }
 }
@@ -209,7 +252,7 @@ void DABaseSet::SetWide(Target target, char const* column, DACompare op, std::ui
 void DABaseSet::AddCondition(char const* column, Condition::Form form, DACompare op, std::vector<std::string> values,
                              bool number, const char* func)
 {
-    StoredCondition condition{DAOwnedString(), form, op, std::move(values), number};
+    StoredCondition condition{DAOwnedString(), form, op, std::move(values), number, {}};
     condition.column.Assign(column);  // copied before the lock: a failed copy leaves the list as it was
     const DAMemberLock lock(&m_conditions, DA_FILE_NAME, func, __LINE__);
     m_conditions.push_back(std::move(condition));
@@ -217,30 +260,88 @@ void DABaseSet::AddCondition(char const* column, Condition::Form form, DACompare
 
 void DABaseSet::SetWhere(char const* column, DACompare op, char const* value)
 {
-    if (Accepted(column, value == nullptr ? "NULL VALUE, CONDITION NOT STORED" : nullptr, __func__)) {
-        AddCondition(column, Condition::Form::Compare, op, {value}, false, __func__);
+    if (!Accepted(column, value == nullptr ? "NULL VALUE, CONDITION NOT STORED" : nullptr, __func__)) {
+        return;
     }
+    if (!IsTextMatch(op)) {
+        AddCondition(column, Condition::Form::Compare, op, {value}, false, __func__);
+        return;
+    }
+    std::string pattern = TextMatchPattern(op, value);
+    if (pattern.size() > kLikePatternLimit) {
+        DA_LOG(DLOG_ERROR, "PATTERN TOO LONG, CONDITION NOT STORED");
+        return;
+    }
+    AddCondition(column, Condition::Form::Compare, op, {std::move(pattern)}, false, __func__);
 }
 
 void DABaseSet::SetWhere(char const* column, DACompare op, int value)
 {
-    if (Accepted(column, nullptr, __func__)) {
+    if (Accepted(column, NumberFailure(op), __func__)) {
         AddCondition(column, Condition::Form::Compare, op, {NumberText(value)}, true, __func__);
     }
 }
 
 void DABaseSet::SetWhere(char const* column, DACompare op, std::int64_t value)
 {
-    if (Accepted(column, nullptr, __func__)) {
+    if (Accepted(column, NumberFailure(op), __func__)) {
         AddCondition(column, Condition::Form::Compare, op, {NumberText(value)}, true, __func__);
     }
 }
 
 void DABaseSet::SetWhere(char const* column, DACompare op, double value)
 {
-    if (Accepted(column, std::isfinite(value) ? nullptr : "INVALID NUMBER, CONDITION NOT STORED", __func__)) {
+    const char* failure = std::isfinite(value) ? NumberFailure(op) : "INVALID NUMBER, CONDITION NOT STORED";
+    if (Accepted(column, failure, __func__)) {
         AddCondition(column, Condition::Form::Compare, op, {NumberText(value)}, true, __func__);
     }
+}
+
+void DABaseSet::SetWhereRow(std::vector<char const*> const& columns, DACompare op, std::vector<DAValue> const& values)
+{
+    const char* const func = __func__;
+    for (char const* column : columns) {
+        if (!Accepted(column, nullptr, func)) {
+            return;
+        }
+    }
+    const char* failure = nullptr;
+    if (columns.empty() || columns.size() != values.size()) {
+        failure = "COLUMN AND VALUE COUNTS DIFFER, CONDITION NOT STORED";
+    } else if (op > DACompare::GreaterEqual) {
+        failure = "INVALID OPERATOR, CONDITION NOT STORED";
+    }
+    for (std::size_t i = 0; failure == nullptr && i < values.size(); ++i) {
+        failure = values[i].GetFailure();
+    }
+    if (failure != nullptr) {
+        DA_LOG_AT(DLOG_ERROR, func, "%s", failure);
+        return;
+    }
+    StoredCondition condition{DAOwnedString(), Condition::Form::Row, op, {}, false, {}};
+    for (std::size_t i = 0; i < values.size(); ++i) {
+        condition.columns.emplace_back(columns[i]);
+        condition.values.push_back(values[i].GetSql());
+    }
+    const DAMemberLock lock(&m_conditions, DA_FILE_NAME, func, __LINE__);
+    m_conditions.push_back(std::move(condition));
+}
+
+void DABaseSet::ClearData()
+{
+    const DAMemberLock lock(&m_dataMap, DA_FILE_NAME, __func__, __LINE__);
+    m_dataMap.clear();
+    m_typed.clear();
+}
+
+void DABaseSet::ClearWhere()
+{
+    {
+        const DAMemberLock lock(&m_whereMap, DA_FILE_NAME, __func__, __LINE__);
+        m_whereMap.clear();
+    }
+    const DAMemberLock lock(&m_conditions, DA_FILE_NAME, __func__, __LINE__);
+    m_conditions.clear();
 }
 
 void DABaseSet::SetWhereIn(char const* column, std::vector<std::string> const& values)
@@ -263,7 +364,54 @@ void DABaseSet::GetConditions(std::vector<Condition>& out)
     std::vector<Condition> copy;
     copy.reserve(m_conditions.size());
     for (const StoredCondition& stored : m_conditions) {
-        copy.push_back({stored.column.Get(), stored.form, stored.op, stored.values, stored.number});
+        const char* column = stored.column.Get();
+        copy.push_back(
+            {column != nullptr ? column : "", stored.form, stored.op, stored.values, stored.number, stored.columns});
     }
     out = std::move(copy);
+}
+
+void DABaseSet::AddTyped(TypedValue value, const char* func)
+{
+    const DAMemberLock lock(&m_dataMap, DA_FILE_NAME, func, __LINE__);
+    if (m_dataMap.count(value.column) == 0 && !HasColumn(m_typed, value.column)) {
+        m_typed.push_back(std::move(value));
+    }
+}
+
+void DABaseSet::SetIncrement(char const* column, std::int64_t delta)
+{
+    if (!DAIsPlainName(column)) {
+        DA_LOG(DLOG_ERROR, "INVALID COLUMN NAME, VALUE NOT STORED");
+        return;
+    }
+    AddTyped({column, false, {}, true, delta}, __func__);
+}
+
+void DABaseSet::SetNull(char const* column)
+{
+    if (!DAIsPlainName(column)) {
+        DA_LOG(DLOG_ERROR, "INVALID COLUMN NAME, VALUE NOT STORED");
+        return;
+    }
+    AddTyped({column, true, {}}, __func__);
+}
+
+void DABaseSet::SetBlob(char const* column, void const* data, std::size_t size)
+{
+    if (!DAIsPlainName(column)) {
+        DA_LOG(DLOG_ERROR, "INVALID COLUMN NAME, VALUE NOT STORED");
+        return;
+    }
+    if (data == nullptr && size > 0) {
+        DA_LOG(DLOG_ERROR, "NULL BLOB, NOT STORED");
+        return;
+    }
+    const auto* bytes = static_cast<const unsigned char*>(data);
+    AddTyped({column, false, std::vector<unsigned char>(bytes, bytes + size)}, __func__);
+}
+
+void DABaseSet::GetTypedData(std::vector<TypedValue>& out)
+{
+    out = m_typed;
 }

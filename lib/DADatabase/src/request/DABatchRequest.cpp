@@ -65,6 +65,7 @@ int DABatchRequest::Add(DADropRequest& request)
 void DABatchRequest::Clear()
 {
     std::vector<char>().swap(m_texts);
+    std::vector<int>().swap(m_inserts);
     m_count = 0;
 }
 
@@ -80,7 +81,12 @@ int DABatchRequest::Add(DAAddColumnRequest& request)
 
 int DABatchRequest::Add(DAInsertRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetInsertSql);
+    m_inserts.reserve(m_inserts.size() + 1);  // so that a failure below leaves the batch as it was
+    const int rc = AddStatement(request, &DASqlGenerator::GetInsertSql);
+    if (rc == SQLITE_OK) {
+        m_inserts.push_back(m_count);
+    }
+    return rc;
 }
 
 int DABatchRequest::Add(DASearchIndexRequest& request)

@@ -107,3 +107,16 @@ void DAQueryRequest::GetGroupBy(std::vector<std::string>& out)
     }
     out = std::move(copy);
 }
+
+void DAQueryRequest::ClearOrderBy()
+{
+    DA_MEMBER_LOCK(m_orderBy);
+    m_orderBy.clear();
+}
+
+void DAQueryRequest::ClearLimit()
+{
+    m_hasLimit = false;
+    m_limitCount = -1;
+    m_limitOffset = 0;
+}

@@ -1,0 +1,43 @@
+#ifndef DATYPEDSTORE_H
+#define DATYPEDSTORE_H
+
+// The storage of typed rows, behind DATypedCursor (every row of a result)
+// and QueryEach (one row at a time, its buffers reused): per value a type
+// byte and 8 bytes (the integer, the double's bits, or for a text or blob
+// its offset in the byte arena, where a 4-byte size precedes the bytes).
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include <sqlite3.h>
+
+#include "DARow.h"
+
+struct DATypedStore {
+    DATypedStore() = default;
+    DATypedStore(const DATypedStore&) = delete;
+    DATypedStore& operator=(const DATypedStore&) = delete;
+
+    // Forgets the rows, keeping the buffers' capacity; the names too unless
+    // keepNames.
+    void Clear(bool keepNames);
+
+    // Appends stmt's current row (its column names first, if none are
+    // known yet). Returns SQLITE_ROW, or SQLITE_NOMEM when SQLite could not
+    // give a text or blob.
+    int Append(sqlite3_stmt* stmt);
+
+    // Takes stmt's column names when no row gave them.
+    void TakeNames(sqlite3_stmt* stmt);
+
+    std::vector<std::string> names;
+    std::vector<unsigned char> types;  // DAValueType per value, row after row
+    std::vector<std::uint64_t> values;
+    std::vector<unsigned char> arena;
+    int rows = 0;
+    int position = -1;
+    DARow row{this};
+};
+
+#endif  // DATYPEDSTORE_H

@@ -1,0 +1,217 @@
+#include "DAWatch.h"
+
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <regex>
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include "DADatabase.h"
+#include "DASession.h"
+#include "DatabaseTestUtil.h"
+#include "TempDirTest.h"
+
+namespace {
+
+const char* const kSeed = "CREATE TABLE contacts(_ID INTEGER PRIMARY KEY, name TEXT);"
+                          "CREATE TABLE groups(_ID INTEGER PRIMARY KEY, title TEXT);"
+                          "INSERT INTO contacts(name) VALUES ('Kim');";
+
+// Runs write in a child process (the log discarded); its exit code.
+int InChild(const std::function<int()>& write)
+{
+    const pid_t pid = fork();
+    if (pid == 0) {
+        dlog_set_sink(&dlog_discard_sink, nullptr);
+        _exit(write());
+    }
+    int status = -1;
+    waitpid(pid, &status, 0);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
+int Threads()
+{
+    return static_cast<int>(std::distance(std::filesystem::directory_iterator("/proc/self/task"), {}));
+}
+
+// A write of step 0 (insert), 1 (update) or 2 (delete) to table at dir,
+// one way of writing.
+using Writer = std::function<int(const std::string& dir, const char* table, int step)>;
+
+// The rows of step 0 (insert), 1 (update) and 2 (delete).
+struct Requests {
+    Requests(const std::string& dir, const char* table)
+    {
+        At(insert, dir, table).SetData("_ID", 7);
+        At(update, dir, table).SetWhere("_ID", 7);
+        update.SetData("_ID", 8);
+        At(remove, dir, table).SetWhere("_ID", 8);
+    }
+    template <typename Target>
+    int Run(Target& target, int step)
+    {
+        return step == 0 ? target.Upsert(insert) : step == 1 ? target.Update(update) : target.Delete(remove);
+    }
+    DAUpsertRequest insert;
+    DAUpdateRequest update;
+    DADeleteRequest remove;
+};
+
+int PerCall(const std::string& dir, const char* table, int step)
+{
+    DADatabase db;
+    return Requests(dir, table).Run(db, step);
+}
+
+const Writer kWriters[] = {
+    PerCall,
+    [](const std::string& dir, const char* table, int step) {
+        DABatchRequest batch;
+        DADeleteRequest nothing;  // changes nothing
+        At(nothing, dir, table).SetWhere("_ID", 99);
+        At(batch, dir).Add(nothing);
+        Requests r(dir, table);
+        step == 0 ? batch.Add(r.insert) : step == 1 ? batch.Add(r.update) : batch.Add(r.remove);
+        return DADatabase().ExecuteBatch(batch);
+    },
+    [](const std::string& dir, const char* table, int step) {  // another program
+        const std::string sql[] = {"INSERT INTO T(_ID) VALUES(NULL)", "UPDATE T SET _ID = _ID", "DELETE FROM T"};
+        const std::string command = "sqlite3 " + dir + "/t.db \"" + sql[step] + "\"";
+        return WEXITSTATUS(std::system(std::regex_replace(command, std::regex("\\bT\\b"), table).c_str()));
+    },
+    [](const std::string& dir, const char* table, int step) {  // leaves the file in WAL mode
+        DASession session;
+        DABasePath location;
+        const int rc = session.Open(At(location, dir));
+        return rc != 0 ? rc : Requests(dir, table).Run(session, step);
+    },
+    PerCall,  // now in WAL mode
+};
+
+class WatchTest : public TempDirTest {
+protected:
+    void SetUp() override
+    {
+        TempDirTest::SetUp();
+        RawDb(PathOf("t.db")).Run(kSeed);
+    }
+    int OpenWatch(DAWatch& watch) { return watch.Open(At(m_location, Dir())); }
+    DABasePath m_location;
+};
+
+}  // namespace
+
+// Every insert, update and delete of a watched table, made in another
+// process by each way of writing, wakes Wait and is reported once; writes
+// to a table not watched are not. No thread is started.
+TEST_F(WatchTest, SeesEveryWriteOfAnotherProcessAndNothingElse)
+{
+    const int threads = Threads();
+    DAWatch watch;
+    const LogCapture quiet;
+    ASSERT_EQ(0, OpenWatch(watch));
+    ASSERT_EQ(0, watch.AddTable("contacts"));
+    Strings changed{"stale"};
+    for (std::size_t way = 0; way < std::size(kWriters); ++way) {
+        for (int step = 0; step < 3; ++step) {
+            ASSERT_EQ(0, InChild([&] { return kWriters[way](Dir(), "groups", step); })) << way;
+            ASSERT_EQ(0, InChild([&] { return kWriters[way](Dir(), "contacts", step); })) << way;
+            EXPECT_EQ(0, watch.Wait(5000, changed));
+            EXPECT_EQ(Strings{"contacts"}, changed) << way << " " << step;
+            EXPECT_EQ(0, watch.Check(changed) + watch.Wait(0, changed));
+            EXPECT_EQ(Strings{}, changed) << way << " " << step;
+        }
+    }
+    EXPECT_EQ(threads, Threads());
+    EXPECT_EQ(threads, Threads());
+}
+
+// A burst written while nobody waits is reported once by the next Check; a
+// dropped and created table stays watched; Unwatch (by a session and per
+// call) leaves the schema as before AddTable and ends the watch's interest.
+TEST_F(WatchTest, BurstDropAndUnwatch)
+{
+    RawDb raw(PathOf("t.db"));
+    const std::string schema = raw.Query("SELECT * FROM sqlite_master ORDER BY name");
+    DAWatch watch;
+    const LogCapture quiet;
+    ASSERT_EQ(0, OpenWatch(watch) + watch.AddTable("contacts") + watch.AddTable("groups"));
+    DASession session;
+    session.SetSyncOnCommit(false);
+    ASSERT_EQ(0, session.Open(m_location));
+    for (int i = 0; i < 10000; ++i) {
+        DAUpsertRequest row;
+        row.SetTable("contacts");
+        row.SetData("name", i);
+        ASSERT_EQ(0, session.Upsert(row));
+    }
+    Strings changed;
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ(Strings{"contacts"}, changed);
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ(Strings{}, changed);
+    raw.Run("DROP TABLE groups; CREATE TABLE groups(_ID INTEGER PRIMARY KEY, title TEXT)");
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ(Strings{"groups"}, changed);
+    raw.Run("INSERT INTO groups(title) VALUES('Gym')");
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ(Strings{"groups"}, changed);
+    DABasePath location;
+    EXPECT_EQ(0, session.Unwatch("contacts") + DADatabase().Unwatch(At(location, Dir()), "groups"));
+    EXPECT_EQ(schema, raw.Query("SELECT * FROM sqlite_master ORDER BY name"));
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ((Strings{"contacts", "groups"}), changed);
+    raw.Run("INSERT INTO groups(title) VALUES('Club')");
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ(Strings{}, changed);
+    ASSERT_EQ(0, watch.AddTable("groups"));
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ(Strings{}, changed);
+    raw.Run("INSERT INTO groups(title) VALUES('Gym')");
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ(Strings{"groups"}, changed);
+    std::filesystem::remove(PathOf("t.db"));
+    EXPECT_EQ(14, watch.Check(changed));
+    EXPECT_EQ(Strings{"groups"}, changed);
+    EXPECT_EQ(-1, watch.GetFd());
+}
+
+// Bad input: one line each, the codes stated in DAWatch.h, nothing created.
+TEST_F(WatchTest, RefusesBadInput)
+{
+    DAWatch watch;
+    Strings changed;
+    LogCapture log;
+    EXPECT_EQ(21, watch.Check(changed));
+    DABasePath missing;
+    missing.SetPath(PathOf("missing").c_str(), "t.db");
+    EXPECT_EQ(14, watch.Open(missing));
+    EXPECT_FALSE(FileExists("missing"));
+    std::ofstream(PathOf("text.db")) << std::string(5000, 'x');
+    DABasePath text;
+    text.SetPath(Dir().c_str(), "text.db");
+    EXPECT_EQ(26, watch.Open(text));
+    ASSERT_EQ(0, OpenWatch(watch));
+    EXPECT_EQ(21, watch.AddTable(nullptr));
+    EXPECT_EQ(21, watch.AddTable("contacts; DROP TABLE groups"));
+    EXPECT_EQ(1, watch.AddTable("people"));
+    EXPECT_EQ(21, DADatabase().Unwatch(m_location, "a b"));
+    const auto line = [](const char* function, const std::string& message) {
+        return Logged(6, "DAWatch.cpp", function, message);
+    };
+    const std::string notPlain = "AddTable FAILED[21]: table name is not a plain name";
+    EXPECT_EQ((Strings{line("Check", "WATCH NOT OPEN"),
+                       line("Open", "DB open failed. Error no(14): unable to open database file"),
+                       line("Open", "DB open failed. Error no(26): file is not a database"), line("AddTable", notPlain),
+                       line("AddTable", notPlain), line("AddTable", "AddTable FAILED[1]: no such table: main.people"),
+                       Logged(6, "DADatabase.cpp", "Unwatch", "Unwatch FAILED[21]: table name is not a plain name")}),
+              Described(log));
+    EXPECT_EQ("", RawDb(PathOf("t.db")).Query("SELECT name FROM sqlite_master WHERE name LIKE 'ulo%'"));
+}
