@@ -18,7 +18,7 @@ LOCATIONS = ("tmpfs", "disk", "memory")
 SECTIONS = [("Write operations", ["write"]), ("Batches", ["batch"]), ("Queries", ["select", "join", "page", "exist"]),
             ("Reading a cursor", ["walk"]), ("Names", ["lock", "intern", "memory"]), ("Conditions", ["cond"]),
             ("Schema", ["schema"]), ("Sessions", ["session"]),
-            ("Typed reads", ["typed"])]
+            ("Typed reads", ["typed"]), ("Search", ["search"])]
 
 
 def ratio(a, b, metric="real", per=None):
@@ -95,6 +95,16 @@ TARGETS = [
     one("session `Query` by key into `DATypedCursor`, tmpfs: lib / raw", "typed/bykey/tmpfs/lib", "raw", "<=", 1.3),
     one("1 MiB blob written and read per call, tmpfs: lib / raw", "typed/blob1MiB/tmpfs/lib", "raw", "<=", 2),
     one("batch of 500 inserts, unsynced session, tmpfs: lib / raw", "typed/batch500/tmpfs/lib", "raw", "<=", 1.2),
+    ("session `Search`, a word with no hit, 50k messages (ms)", of("search/NoHit50000/tmpfs/lib", "real", 1000),
+     "<=", 0.1),
+    one("a word with no hit, 50k messages: `Contains` / `Search`", "search/NoHit50000/tmpfs/contains", "lib", ">=",
+        50),
+    one("session `Search` first page of 20, best first: lib / raw FTS5", "search/FirstPage50000/tmpfs/lib", "raw",
+        "<=", 1.5),
+    one("`CreateSearchIndex` over 50k messages: lib / raw 'rebuild'", "search/Index50000/tmpfs/lib", "raw", "<=",
+        1.3),
+    one("10k inserts in batches of 100 into an indexed table: lib / raw", "search/Insert10000/tmpfs/lib", "raw",
+        "<=", 1.3),
     ("session held (KiB beyond the page cache)", of("session/Select/tmpfs/lib", "held_bytes", 1024), "<=", 1024),
 ]
 
