@@ -591,7 +591,7 @@ void DASqlGenerator::GetCreateSearchIndexSql(DASearchIndexRequest& request, std:
     for (const std::string& column : columns) {
         list += ", " + column;
         values += ", NEW." + column;
-        changed += " OR OLD." + column + " IS NOT NEW." + column;
+        changed.append(" OR OLD.").append(column).append(" IS NOT NEW.").append(column);
     }
     const std::string insert = "INSERT INTO " + index + "(rowid" + list + ") VALUES (NEW.rowid" + values + "); END";
     const std::string trigger = "; CREATE TRIGGER IF NOT EXISTS " + index;
