@@ -36,6 +36,7 @@ void ConditionCases(const Location& at);
 void NameCases();
 void QueryCases(const Location& at);
 void SchemaCases(const Location& at);
+void SearchCases(const Location& at);
 void SessionCases(const Location& at);
 void TypedCases(const Location& at);
 void WatchCases(const Location& at);

@@ -18,7 +18,7 @@ LOCATIONS = ("tmpfs", "disk", "memory")
 SECTIONS = [("Write operations", ["write"]), ("Batches", ["batch"]), ("Queries", ["select", "join", "page", "exist"]),
             ("Reading a cursor", ["walk"]), ("Names", ["lock", "intern", "memory"]), ("Conditions", ["cond"]),
             ("Schema", ["schema"]), ("Sessions", ["session"]),
-            ("Typed reads", ["typed"]), ("Watching", ["watch"])]
+            ("Typed reads", ["typed"]), ("Watching", ["watch"]), ("Search", ["search"])]
 
 
 def ratio(a, b, metric="real", per=None):
@@ -104,6 +104,16 @@ TARGETS = [
     ("`Check` after a wake-up, 10 watched tables (µs)", of("watch/check10/tmpfs/lib", "real", 1), "<=", 50),
     ("session write meeting another process's 20 ms write (ms)", of("watch/busy/tmpfs/session", "real", 1e3), "<=",
      25),
+    ("session `Search`, a word with no hit, 50k messages (ms)", of("search/NoHit50000/tmpfs/lib", "real", 1000),
+     "<=", 0.1),
+    one("a word with no hit, 50k messages: `Contains` / `Search`", "search/NoHit50000/tmpfs/contains", "lib", ">=",
+        50),
+    one("session `Search` first page of 20, best first: lib / raw FTS5", "search/FirstPage50000/tmpfs/lib", "raw",
+        "<=", 1.5),
+    one("`CreateSearchIndex` over 50k messages: lib / raw 'rebuild'", "search/Index50000/tmpfs/lib", "raw", "<=",
+        1.3),
+    one("10k inserts in batches of 100 into an indexed table: lib / raw", "search/Insert10000/tmpfs/lib", "raw",
+        "<=", 1.3),
     ("session held (KiB beyond the page cache)", of("session/Select/tmpfs/lib", "held_bytes", 1024), "<=", 1024),
 ]
 

@@ -196,6 +196,24 @@ const OperationCase kOperations[] = {
          rc = rc * 10 + RUN(t, Select, select, cursor);
          return rc * 10 + RUN(t, Query, query, cursor) + RUN(t, Select, select, cursor);
      }},
+    {"search_index_by_migration_then_dropped",
+     [](Target& t, const std::string& dir, DACursor& cursor) {
+         DASearchIndexRequest index;
+         At(index, dir, "contacts").SetName("names");
+         index.AddColumn("name");
+         DABatchRequest step;
+         At(step, dir).Add(index);
+         DASearchRequest search;
+         At(search, dir, "contacts").SetIndex("names");
+         search.SetText("LE");
+         search.SetPrefixLast();
+         search.AddSnippet("name", "<", ">", 2, "hit");
+         int rc = RUN(t, Migrate, step, 1) * 10 + RUN(t, Search, search, cursor);
+         DABasePath at;
+         rc = rc * 10 +
+             (t.session != nullptr ? t.session->DropSearchIndex("names") : t.db->DropSearchIndex(At(at, dir), "names"));
+         return rc * 10 + RUN(t, Search, search, cursor) + RUN(t, CreateSearchIndex, index);
+     }},
     {"keeping_rows_counters_row_ids_applied_steps",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAUpsertRequest keep;  // updates row 1 in place: its phone stays

@@ -97,6 +97,18 @@ void Fill(DAAddColumnRequest& request, const SqlCase& c)
     }
 }
 
+// first: the index's name; second: the columns.
+void Fill(DASearchIndexRequest& request, const SqlCase& c)
+{
+    request.SetTable(c.table);
+    request.SetName(c.first.at(0).first);
+    request.SetTokens(std::string(c.first.at(0).second) == "Substrings" ? DASearchTokens::Substrings
+                                                                        : DASearchTokens::Words);
+    for (const auto& column : c.second) {
+        request.AddColumn(column.first);
+    }
+}
+
 void Fill(DABasePath& /*location*/, const SqlCase& /*c*/)
 {
 }
@@ -140,9 +152,12 @@ const Kind kAddColumn = Generated<DAAddColumnRequest, &DASqlGenerator::GetAddCol
 const Kind kCompact = Generated<DABasePath, &DASqlGenerator::GetCompactSql>;
 const Kind kQuery = Generated<DAQueryRequest, &DASqlGenerator::GetQuerySql>;
 const Kind kInsert = Generated<DAInsertRequest, &DASqlGenerator::GetInsertSql>;
+const Kind kSearchIndex = Generated<DASearchIndexRequest, &DASqlGenerator::GetCreateSearchIndexSql>;
+const Kind kSearch = Generated<DASearchRequest, &DASqlGenerator::GetSearchSql>;
 
 // Listed conditions and select lists, as the rows below use them.
 const auto Q = [](DABaseSet& r) -> DAQueryRequest& { return static_cast<DAQueryRequest&>(r); };
+const auto S = [](DABaseSet& r) -> DASearchRequest& { return static_cast<DASearchRequest&>(r); };
 const auto U = [](DABaseSet& r) -> DAUpsertRequest& { return static_cast<DAUpsertRequest&>(r); };
 const auto TsBefore = [](DABaseSet& r) { r.SetWhere("ts", DACompare::Less, std::int64_t{1700000000000}); };
 
@@ -250,6 +265,26 @@ const SqlCase kCases[] = {
      "INSERT INTO contacts (name, phone) VALUES ('Kim''s', '010')"},
     {kInsert, kContacts, {{kName, "Kim"}}, {}, "INSERT OR IGNORE INTO contacts (name) VALUES ('Kim')",
      [](DABaseSet& r) { static_cast<DAInsertRequest&>(r).SetIgnoreExisting(); }},
+    {kSearchIndex, "m", {{"i", ""}}, {{"a", ""}, {"b", ""}},
+     "CREATE VIRTUAL TABLE IF NOT EXISTS ulo_search_i USING fts5(a, b, tokenize='unicode61 remove_diacritics 2', "
+     "prefix='2 3'); INSERT INTO ulo_search_i(rowid, a, b) SELECT rowid, a, b FROM m WHERE rowid NOT IN (SELECT rowid "
+     "FROM ulo_search_i); CREATE TRIGGER IF NOT EXISTS ulo_search_i_insert AFTER INSERT ON m BEGIN DELETE FROM "
+     "ulo_search_i WHERE rowid = NEW.rowid; INSERT INTO ulo_search_i(rowid, a, b) VALUES (NEW.rowid, NEW.a, NEW.b); "
+     "END; CREATE TRIGGER IF NOT EXISTS ulo_search_i_update AFTER UPDATE ON m WHEN OLD.rowid IS NOT NEW.rowid OR "
+     "OLD.a IS NOT NEW.a OR OLD.b IS NOT NEW.b BEGIN DELETE FROM ulo_search_i WHERE rowid IN (OLD.rowid, NEW.rowid); "
+     "INSERT INTO ulo_search_i(rowid, a, b) VALUES (NEW.rowid, NEW.a, NEW.b); END; CREATE TRIGGER IF NOT EXISTS "
+     "ulo_search_i_delete AFTER DELETE ON m BEGIN DELETE FROM ulo_search_i WHERE rowid = OLD.rowid; END"},
+    {kSearch, "m", {}, {{"c", "7"}}, "SELECT m.*, ulo_hit.s FROM m JOIN (SELECT rowid AS ulo_rowid, rank AS ulo_rank, "
+     "snippet(ulo_search_i, IFNULL((SELECT cid FROM pragma_table_info('ulo_search_i') WHERE name='b'), 32767), "
+     "'<''', '>', '\u2026', 64) AS s FROM ulo_search_i WHERE ulo_search_i MATCH '\"Kim''s\" \"\"\"a\"\"\"*') AS ulo_hit "
+     "ON m.rowid = ulo_hit.ulo_rowid WHERE c='7' ORDER BY ulo_hit.ulo_rank LIMIT 20",
+     [](DABaseSet& r) { S(r).SetIndex("i"), S(r).SetText(" Kim's\t\"a\"\u3000"), S(r).SetPrefixLast();
+        S(r).AddSnippet("b", "<'", ">", 99, "s"), S(r).SetLimit(20); }},
+    {kSearch, "m", {}, {}, "SELECT _ID FROM m JOIN (SELECT rowid AS ulo_rowid, rank AS ulo_rank FROM ulo_search_i "
+     "WHERE ulo_search_i MATCH CASE WHEN (SELECT sql FROM sqlite_master WHERE name='ulo_search_i') LIKE "
+     "'%''trigram''%' THEN '\"東京 駅\"' ELSE '\"東京\" \"駅\"' END) AS ulo_hit ON m.rowid = ulo_hit.ulo_rowid "
+     "ORDER BY ts DESC", [](DABaseSet& r) { S(r).SetIndex("i"), S(r).SetText("東京 駅 "), Q(r).AddColumn("_ID");
+        Q(r).SetOrderBy("ts", true); }},
     {kUpsert, kContacts, {{kName, "Kim"}}, {},
      "INSERT OR REPLACE INTO contacts (name, photo, email) VALUES ('Kim', X'89504E47', NULL)",
      [](DABaseSet& r) { r.SetBlob("photo", "\x89PNG", 4), r.SetNull("email"); }},

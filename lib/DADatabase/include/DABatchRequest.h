@@ -12,6 +12,7 @@
 #include "DADeleteRequest.h"
 #include "DADropRequest.h"
 #include "DAInsertRequest.h"
+#include "DASearchIndexRequest.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
@@ -68,6 +69,9 @@ public:
     ///@}
     /// Writes the request's statement as Insert would, with Add's rules.
     int Add(DAInsertRequest& request);
+    /// Writes the statements of a search index as CreateSearchIndex would
+    /// (they run inside the batch's transaction), with Add's rules.
+    int Add(DASearchIndexRequest& request);
 
     /// The number of statements held.
     int GetCount() const { return m_count; }

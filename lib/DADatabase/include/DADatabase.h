@@ -19,6 +19,8 @@
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
 #include "DARow.h"
+#include "DASearchIndexRequest.h"
+#include "DASearchRequest.h"
 #include "DASelectRequest.h"
 #include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
@@ -201,6 +203,39 @@ public:
     int Update(DAUpdateRequest& request, int& changes);
     int Delete(DADeleteRequest& request, int& changes);
     ///@}
+
+    /// Creates the search index request describes (DASearchIndexRequest
+    /// lists what it adds; DASqlGenerator::GetCreateSearchIndexSql gives
+    /// the statements) and indexes the rows already there, all in one
+    /// transaction ("BEGIN IMMEDIATE" ... "COMMIT", busy-retry as
+    /// ExecuteBatch). From then on the triggers keep it in step with every
+    /// insert, update and delete of the table by any connection, an INSERT
+    /// OR REPLACE included. An index of that name already there is left as
+    /// it is. A missing table or column fails with SQLite's code and text,
+    /// and the file keeps nothing of the attempt. Lines "CreateSearchIndex
+    /// SUCCESS[0]" / "CreateSearchIndex FAILED[rc]: text"; a failed open
+    /// writes only OpenDB's line.
+    int CreateSearchIndex(DASearchIndexRequest& request);
+
+    /// Removes everything CreateSearchIndex added for the index name, in
+    /// one transaction; also when its table is gone, and 0 when there is
+    /// nothing to remove. Lines "DropSearchIndex SUCCESS[0]" /
+    /// "DropSearchIndex FAILED[rc]: text". A name that is not plain (see
+    /// DASearchIndexRequest), null included, returns 21 with the line
+    /// "DropSearchIndex FAILED[21]: invalid name", nothing opened.
+    int DropSearchIndex(DABasePath& location, char const* name);
+
+    /// The rows of request's table that hold every word of its text
+    /// (DASearchRequest, DASqlGenerator::GetSearchSql), in Query's frame:
+    /// the same codes, cursor handling and lines, under the function name
+    /// "Search" and the word "SEARCH" ("SEARCH FAILED[rc]: text"). An empty
+    /// text returns 0 with an emptied cursor. A missing index or table
+    /// fails at the preparation with 1 and SQLite's text ("no such table:
+    /// ulo_search_i").
+    int Search(DASearchRequest& request, DACursor& cursor);
+    /// Search into a typed cursor: the statement, codes and lines of the
+    /// search, the cursor handled as Query's typed overload handles it.
+    int Search(DASearchRequest& request, DATypedCursor& cursor);
 
     /// Removes from location's file what watching table left there (see
     /// DAWatch.h): its three triggers and its counter, and the counter table

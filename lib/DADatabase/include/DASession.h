@@ -17,6 +17,8 @@
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
 #include "DARow.h"
+#include "DASearchIndexRequest.h"
+#include "DASearchRequest.h"
 #include "DASelectRequest.h"
 #include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
@@ -204,6 +206,15 @@ public:
     int Insert(DAInsertRequest& request, std::int64_t& rowId);
     int Update(DAUpdateRequest& request, int& changes);
     int Delete(DADeleteRequest& request, int& changes);
+    ///@}
+
+    ///@{
+    /// DADatabase's search operations, at the session's file: codes and
+    /// lines as stated in DADatabase.h. Search is a read.
+    int CreateSearchIndex(DASearchIndexRequest& request);
+    int DropSearchIndex(char const* name);
+    int Search(DASearchRequest& request, DACursor& cursor);
+    int Search(DASearchRequest& request, DATypedCursor& cursor);
     ///@}
 
     /// DADatabase::Unwatch at the session's file: codes and lines as stated

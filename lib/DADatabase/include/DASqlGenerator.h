@@ -12,6 +12,8 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DASearchIndexRequest.h"
+#include "DASearchRequest.h"
 #include "DASelectRequest.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
@@ -92,6 +94,42 @@ public:
     /// "INSERT INTO t (a, b) VALUES ('1', '2')" (GetUpsertSql's shape), or
     /// "INSERT OR IGNORE INTO ..." when the request ignores existing rows.
     void GetInsertSql(DAInsertRequest& request, std::string& sql);
+
+    /// The statements of a search index (DASearchIndexRequest lists what
+    /// they add), ';'-separated, in this order: "CREATE VIRTUAL TABLE IF
+    /// NOT EXISTS ulo_search_i USING fts5(a, b, tokenize='unicode61
+    /// remove_diacritics 2', prefix='2 3')" (Substrings: "tokenize='trigram'"),
+    /// the rows of t not yet held ("INSERT INTO ulo_search_i(rowid, a, b)
+    /// SELECT rowid, a, b FROM t WHERE rowid NOT IN (...)"), then the
+    /// triggers "CREATE TRIGGER IF NOT EXISTS ulo_search_i_insert AFTER
+    /// INSERT ON t ...", "..._update AFTER UPDATE ON t WHEN ..." (the rowid
+    /// or an indexed column changed) and "..._delete AFTER DELETE ON t ...".
+    /// Each trigger first deletes the entry of the old and the new rowid,
+    /// then inserts the new row's, so an INSERT OR REPLACE keeps the index
+    /// in step whatever recursive_triggers says.
+    void GetCreateSearchIndexSql(DASearchIndexRequest& request, std::string& sql);
+
+    /// "DROP TRIGGER IF EXISTS ulo_search_i_insert; ..._update; ..._delete;
+    /// DROP TABLE IF EXISTS ulo_search_i": everything the index added.
+    void GetDropSearchIndexSql(std::string name, std::string& sql);
+
+    /// "SELECT t.*, ulo_hit.s FROM t JOIN (SELECT rowid AS ulo_rowid, rank
+    /// AS ulo_rank, snippet(ulo_search_i, ...) AS s FROM ulo_search_i WHERE
+    /// ulo_search_i MATCH '\"cafe\" \"au\"*') AS ulo_hit ON t.rowid =
+    /// ulo_hit.ulo_rowid" (the select list in place of "t.*" when set), then
+    /// GetQuerySql's conditions, groups, " ORDER BY ulo_hit.ulo_rank" (best
+    /// first) unless sort keys are set, and page.
+    ///
+    /// The text is cut into words at white space (ASCII, U+00A0, U+3000);
+    /// each word becomes an FTS5 string (double quotes doubled), which the
+    /// index splits as it splits its text ("e-mail" finds the words e and
+    /// mail in a row), all of them required, the last with "*" when
+    /// GetPrefixLast; no word at all is the query "\"\"", which matches
+    /// nothing. A word shorter than 3 characters cannot be found through
+    /// trigrams: when there is one, the operand is a CASE that, for a
+    /// Substrings index, looks up the whole text (trimmed) as one substring
+    /// instead, and matches nothing when that is shorter than 3 characters.
+    void GetSearchSql(DASearchRequest& request, std::string& sql);
 };
 
 #endif  // DASQLGENERATOR_H

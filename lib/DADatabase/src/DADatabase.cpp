@@ -195,6 +195,30 @@ int DADatabase::Delete(DADeleteRequest& request, int& changes)
     return DAOperations::Delete(visit, request, changes);
 }
 
+int DADatabase::CreateSearchIndex(DASearchIndexRequest& request)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::CreateSearchIndex(visit, request);
+}
+
+int DADatabase::DropSearchIndex(DABasePath& location, char const* name)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::DropSearchIndex(visit, location, name);
+}
+
+int DADatabase::Search(DASearchRequest& request, DACursor& cursor)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Search(visit, request, cursor);
+}
+
+int DADatabase::Search(DASearchRequest& request, DATypedCursor& cursor)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Search(visit, request, cursor);
+}
+
 int DADatabase::Unwatch(DABasePath& location, char const* table)
 {
     DAVisit visit(*this, __LINE__);

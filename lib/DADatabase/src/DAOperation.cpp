@@ -291,6 +291,29 @@ int RunRead(DAConnectionSource& source, DABasePath& location, const char* sql, s
     return rc;
 }
 
+// Statements that land together or not at all ("<func> SUCCESS[0]" or
+// "<func> FAILED[rc]: text", as the write frame logs): sql's statements
+// in one transaction on a connection for writing.
+int RunScript(DAConnectionSource& source, DABasePath& location, const std::string& sql, const char* func)
+{
+    DALease db;
+    int rc = source.Acquire(location, DAAccess::Write, func, db);
+    if (rc != SQLITE_OK) {
+        return rc;
+    }
+    DAErrorText error;
+    int step = 0;
+    const auto none = [] { return SQLITE_OK; };
+    rc = RunTransaction(source, db.get(), sql.c_str(), 1, error, step, none, none);
+    if (rc == SQLITE_OK) {
+        DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "%s SUCCESS[%d]", func, rc);
+    } else {
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", func, rc,
+                     FailureText(error, rc));
+    }
+    return rc;
+}
+
 const char* const kReadVersion = "PRAGMA user_version";
 
 // Refuses a table name that is not plain, with the line "<func>
@@ -450,8 +473,16 @@ int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DAC
 
 int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DATypedCursor& cursor)
 {
+    return TypedQuery(source, request, &DASqlGenerator::GetQuerySql, cursor, "Query", "QUERY");
+}
+
+template <typename Request>
+int DAOperations::TypedQuery(DAConnectionSource& source, Request& request,
+                             void (DASqlGenerator::*generate)(Request&, std::string&), DATypedCursor& cursor,
+                             const char* func, const char* word)
+{
     return RunRowsQuery(
-        source, request, &DASqlGenerator::GetQuerySql, "Query", "QUERY", true, true,
+        source, request, generate, func, word, true, true,
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, bool mayBeStale) {
             if (cursor.m_store == nullptr) {  // moved from
                 cursor.m_store = std::make_unique<DATypedStore>();
@@ -615,6 +646,36 @@ int DAOperations::Delete(DAConnectionSource& source, DADeleteRequest& request, i
 {
     return RunWrite(source, request, &DASqlGenerator::GetDeleteSql, "Delete", "delete",
                     [&](sqlite3* db) { changes = sqlite3_changes(db); });
+}
+
+int DAOperations::CreateSearchIndex(DAConnectionSource& source, DASearchIndexRequest& request)
+{
+    std::string sql;
+    DASqlGenerator().GetCreateSearchIndexSql(request, sql);
+    return RunScript(source, request, sql, "CreateSearchIndex");
+}
+
+int DAOperations::DropSearchIndex(DAConnectionSource& source, DABasePath& location, char const* name)
+{
+    const char* const func = "DropSearchIndex";
+    if (!DAIsPlainName(name)) {
+        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "DropSearchIndex FAILED[%d]: invalid name",
+                     SQLITE_MISUSE);
+        return SQLITE_MISUSE;
+    }
+    std::string sql;
+    DASqlGenerator().GetDropSearchIndexSql(name, sql);
+    return RunScript(source, location, sql, func);
+}
+
+int DAOperations::Search(DAConnectionSource& source, DASearchRequest& request, DACursor& cursor)
+{
+    return RunCursorQuery(source, request, &DASqlGenerator::GetSearchSql, cursor, "Search", "SEARCH", true, true);
+}
+
+int DAOperations::Search(DAConnectionSource& source, DASearchRequest& request, DATypedCursor& cursor)
+{
+    return TypedQuery(source, request, &DASqlGenerator::GetSearchSql, cursor, "Search", "SEARCH");
 }
 
 int DAOperations::Watch(DAConnectionSource& source, DABasePath& location, char const* table, std::int64_t& changes,

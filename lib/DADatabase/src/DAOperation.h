@@ -25,6 +25,8 @@
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
 #include "DARow.h"
+#include "DASearchIndexRequest.h"
+#include "DASearchRequest.h"
 #include "DASelectRequest.h"
 #include "DASqliteHandles.h"
 #include "DATypedCursor.h"
@@ -32,6 +34,7 @@
 #include "DAUpsertRequest.h"
 
 class DAConnectionSource;
+class DASqlGenerator;
 
 // Ends a lease: a per-call visit closes the connection, a session takes it
 // back (and lets the next writer in).
@@ -132,6 +135,17 @@ struct DAOperations {
     static int Insert(DAConnectionSource& source, DAInsertRequest& request, std::int64_t& rowId);
     static int Update(DAConnectionSource& source, DAUpdateRequest& request, int& changes);
     static int Delete(DAConnectionSource& source, DADeleteRequest& request, int& changes);
+    static int CreateSearchIndex(DAConnectionSource& source, DASearchIndexRequest& request);
+    static int DropSearchIndex(DAConnectionSource& source, DABasePath& location, char const* name);
+    static int Search(DAConnectionSource& source, DASearchRequest& request, DACursor& cursor);
+    static int Search(DAConnectionSource& source, DASearchRequest& request, DATypedCursor& cursor);
+
+    // A query whose rows fill a typed cursor, in Query's frame, under func
+    // and word: the typed Query and Search.
+    template <typename Request>
+    static int TypedQuery(DAConnectionSource& source, Request& request,
+                          void (DASqlGenerator::*generate)(Request&, std::string&), DATypedCursor& cursor,
+                          const char* func, const char* word);
 
     // Installs, under the write lock, what watching table needs in the file
     // (DAWatchSchema.h; kept if there): 0 with changes and schema the

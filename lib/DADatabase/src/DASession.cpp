@@ -606,6 +606,31 @@ int DASession::Delete(DADeleteRequest& request, int& changes)
     return DAOperations::Delete(source, request, changes);
 }
 
+int DASession::CreateSearchIndex(DASearchIndexRequest& request)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::CreateSearchIndex(source, request);
+}
+
+int DASession::DropSearchIndex(char const* name)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    return DAOperations::DropSearchIndex(source, here, name);
+}
+
+int DASession::Search(DASearchRequest& request, DACursor& cursor)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::Search(source, request, cursor);
+}
+
+int DASession::Search(DASearchRequest& request, DATypedCursor& cursor)
+{
+    DASessionCall source(*m_state, __LINE__);
+    return DAOperations::Search(source, request, cursor);
+}
+
 int DASession::Unwatch(char const* table)
 {
     DASessionCall source(*m_state, __LINE__);

@@ -172,6 +172,59 @@ void WriteInsert(const char* head, DABaseSet& request, const std::string& table,
     sql = std::move(text);
 }
 
+// The select list's items, each followed by ", ": "type, COUNT(*) AS n, ".
+void AppendSelectList(std::string& text, const std::vector<DAQueryRequest::SelectItem>& items)
+{
+    static const char* const kFunctions[] = {"COUNT(", "MIN(", "MAX(", "SUM(", "AVG("};
+    for (const auto& item : items) {
+        if (item.aggregate) {
+            text += kFunctions[static_cast<int>(item.function)];
+            text += item.column.empty() ? "*" : item.column;
+            text += ") AS " + item.as;
+        } else {
+            text += item.column;
+        }
+        text += ", ";
+    }
+}
+
+// " GROUP BY a, b", " ORDER BY a, b DESC" (or by defaultOrder, when given,
+// without sort keys), " LIMIT n OFFSET m": the end of every query.
+void AppendQueryTail(std::string& text, DAQueryRequest& request, const char* defaultOrder)
+{
+    DAOrderKeys keys;
+    int count = -1;
+    int offset = 0;
+    std::vector<std::string> groups;
+    request.GetOrderBy(keys);
+    request.GetLimit(count, offset);
+    request.GetGroupBy(groups);
+    if (!groups.empty()) {
+        text += " GROUP BY ";
+        for (const auto& group : groups) {
+            text += group + ", ";
+        }
+        text.resize(text.size() - 2);
+    }
+    if (!keys.empty()) {
+        text += " ORDER BY ";
+        for (const auto& key : keys) {
+            text += key.first;
+            text += key.second ? " DESC, " : ", ";
+        }
+        CutAtLast(text, ", ");
+    } else if (defaultOrder != nullptr) {
+        text += " ORDER BY ";
+        text += defaultOrder;
+    }
+    if (count >= 0 || offset > 0) {
+        text += " LIMIT " + std::to_string(count);
+        if (offset > 0) {
+            text += " OFFSET " + std::to_string(offset);
+        }
+    }
+}
+
 }  // namespace
 
 // By-value parameter: the signature of the published interface.
@@ -253,60 +306,22 @@ void DASqlGenerator::GetSelectSql(DASelectRequest& request, std::string& sql)
 
 void DASqlGenerator::GetQuerySql(DAQueryRequest& request, std::string& sql)
 {
-    DAOrderKeys keys;
-    int count = -1;
-    int offset = 0;
-    request.GetOrderBy(keys);
-    request.GetLimit(count, offset);
-
     std::vector<DAQueryRequest::SelectItem> items;
-    std::vector<std::string> groups;
     request.GetColumns(items);
-    request.GetGroupBy(groups);
 
     std::string text;
     if (items.empty()) {
         GetSelectSql(request, text);
     } else {
-        static const char* const kFunctions[] = {"COUNT(", "MIN(", "MAX(", "SUM(", "AVG("};
         std::string table;
         request.GetTable(table);
         text = "SELECT ";
-        for (const auto& item : items) {
-            if (item.aggregate) {
-                text += kFunctions[static_cast<int>(item.function)];
-                text += item.column.empty() ? "*" : item.column;
-                text += ") AS " + item.as;
-            } else {
-                text += item.column;
-            }
-            text += ", ";
-        }
+        AppendSelectList(text, items);
         text.resize(text.size() - 2);
         text += " FROM " + table;
         AppendWhere(text, request, false);
     }
-    if (!groups.empty()) {
-        text += " GROUP BY ";
-        for (const auto& group : groups) {
-            text += group + ", ";
-        }
-        text.resize(text.size() - 2);
-    }
-    if (!keys.empty()) {
-        text += " ORDER BY ";
-        for (const auto& key : keys) {
-            text += key.first;
-            text += key.second ? " DESC, " : ", ";
-        }
-        CutAtLast(text, ", ");
-    }
-    if (count >= 0 || offset > 0) {
-        text += " LIMIT " + std::to_string(count);
-        if (offset > 0) {
-            text += " OFFSET " + std::to_string(offset);
-        }
-    }
+    AppendQueryTail(text, request, nullptr);
     sql = std::move(text);
 }
 
@@ -463,4 +478,203 @@ void DASqlGenerator::GetInsertSql(DAInsertRequest& request, std::string& sql)
     std::string table;
     request.GetTable(table);
     WriteInsert(request.GetIgnoreExisting() ? "INSERT OR IGNORE INTO " : "INSERT INTO ", request, table, sql);
+}
+
+namespace {
+
+// What creating a search index adds is named after it with this prefix.
+const char* const kSearchPrefix = "ulo_search_";
+// A trigram holds 3 characters: shorter words cannot be looked up.
+constexpr std::size_t kTrigram = 3;
+
+// The length of a separator (ASCII white space, U+00A0, U+3000) at text[at],
+// 0 when there is none.
+std::size_t SeparatorAt(const std::string& text, std::size_t at)
+{
+    static const char* const kWide[] = {"\xC2\xA0", "\xE3\x80\x80"};
+    if (std::strchr(" \t\n\v\f\r", text[at]) != nullptr) {
+        return 1;
+    }
+    for (const char* wide : kWide) {
+        if (text.compare(at, std::strlen(wide), wide) == 0) {
+            return std::strlen(wide);
+        }
+    }
+    return 0;
+}
+
+// The characters of UTF-8 text (bytes that do not continue one).
+std::size_t CharacterCount(const std::string& text)
+{
+    return static_cast<std::size_t>(std::count_if(
+        text.begin(), text.end(), [](char c) { return (static_cast<unsigned char>(c) & 0xC0U) != 0x80U; }));
+}
+
+// text as one FTS5 string: between double quotes, each one inside doubled,
+// so that the engine reads every character as text.
+std::string Fts5String(const std::string& text)
+{
+    std::string out = "\"";
+    for (const char c : text) {
+        out += c;
+        if (c == '"') {
+            out += '"';
+        }
+    }
+    return out + '"';
+}
+
+// The MATCH operand for typed: its words (split at separators) each as an
+// FTS5 string, all required, the last one a prefix when asked. The index
+// splits each string as it splits text; a string without a token of its
+// own (only punctuation) is left out by the engine, and the query of no
+// string, "", matches nothing. A Substrings index cannot find a word
+// shorter than a trigram, so when there is one the statement reads the
+// index's tokenizer from the schema and, for trigram, looks up the whole
+// text as one substring instead (nothing when it is shorter still).
+void AppendMatch(std::string& sql, const std::string& typed, bool prefix, const std::string& index)
+{
+    std::string words;
+    std::string::size_type first = std::string::npos;
+    std::string::size_type end = 0;
+    bool shortWord = false;
+    for (std::size_t at = 0; at < typed.size();) {
+        std::size_t start = at;
+        while (at < typed.size() && SeparatorAt(typed, at) == 0) {
+            ++at;
+        }
+        if (at > start) {
+            const std::string word = typed.substr(start, at - start);
+            words += (words.empty() ? "" : " ") + Fts5String(word);
+            shortWord = shortWord || CharacterCount(word) < kTrigram;
+            first = std::min(first, start);
+            end = at;
+        }
+        while (at < typed.size() && SeparatorAt(typed, at) != 0) {
+            at += SeparatorAt(typed, at);
+        }
+    }
+    if (words.empty()) {
+        words = "\"\"";
+    } else if (prefix) {
+        words += '*';
+    }
+    if (!shortWord) {
+        AppendLiteral(sql, words);
+        return;
+    }
+    const std::string whole = typed.substr(first, end - first);
+    sql += "CASE WHEN (SELECT sql FROM sqlite_master WHERE name=";
+    AppendLiteral(sql, index);
+    sql += ") LIKE '%''trigram''%' THEN ";
+    AppendLiteral(sql, CharacterCount(whole) < kTrigram ? "\"\"" : Fts5String(whole));
+    sql += " ELSE ";
+    AppendLiteral(sql, words);
+    sql += " END";
+}
+
+}  // namespace
+
+void DASqlGenerator::GetCreateSearchIndexSql(DASearchIndexRequest& request, std::string& sql)
+{
+    std::string table;
+    std::string name;
+    std::vector<std::string> columns;
+    request.GetTable(table);
+    request.GetName(name);
+    request.GetColumns(columns);
+
+    const std::string index = kSearchPrefix + name;
+    std::string list;
+    std::string values;
+    std::string changed;
+    for (const std::string& column : columns) {
+        list += ", " + column;
+        values += ", NEW." + column;
+        changed.append(" OR OLD.").append(column).append(" IS NOT NEW.").append(column);
+    }
+    const std::string insert = "INSERT INTO " + index + "(rowid" + list + ") VALUES (NEW.rowid" + values + "); END";
+    const std::string trigger = "; CREATE TRIGGER IF NOT EXISTS " + index;
+    // The rows already there first: a missing table or column fails here,
+    // before any trigger. A row held already (creating again) is skipped.
+    // Each trigger deletes before it inserts: an INSERT OR REPLACE of a row
+    // deletes the old one without the delete trigger (unless recursive
+    // triggers are on), and its entry must not outlive it; a statement's
+    // own conflict clause would override one written in the trigger.
+    std::string text = "CREATE VIRTUAL TABLE IF NOT EXISTS " + index + " USING fts5(" +
+        (list.empty() ? list : list.substr(2)) +
+        (request.GetTokens() == DASearchTokens::Substrings
+             ? ", tokenize='trigram')"
+             : ", tokenize='unicode61 remove_diacritics 2', prefix='2 3')");
+    text += "; INSERT INTO " + index + "(rowid" + list + ") SELECT rowid" + list + " FROM " + table +
+        " WHERE rowid NOT IN (SELECT rowid FROM " + index + ")";
+    text += trigger + "_insert AFTER INSERT ON " + table + " BEGIN DELETE FROM " + index +
+        " WHERE rowid = NEW.rowid; " + insert;
+    text += trigger + "_update AFTER UPDATE ON " + table + " WHEN OLD.rowid IS NOT NEW.rowid" + changed +
+        " BEGIN DELETE FROM " + index + " WHERE rowid IN (OLD.rowid, NEW.rowid); " + insert;
+    text +=
+        trigger + "_delete AFTER DELETE ON " + table + " BEGIN DELETE FROM " + index + " WHERE rowid = OLD.rowid; END";
+    sql = std::move(text);
+}
+
+// By-value parameter: the shape of GetCheckTableSql.
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
+void DASqlGenerator::GetDropSearchIndexSql(std::string name, std::string& sql)
+{
+    const std::string index = kSearchPrefix + name;
+    std::string text;
+    for (const char* trigger : {"_insert", "_update", "_delete"}) {
+        text += "DROP TRIGGER IF EXISTS " + index + trigger + "; ";
+    }
+    sql = text + "DROP TABLE IF EXISTS " + index;
+}
+
+void DASqlGenerator::GetSearchSql(DASearchRequest& request, std::string& sql)
+{
+    std::string table;
+    std::string name;
+    std::string typed;
+    std::vector<DAQueryRequest::SelectItem> items;
+    std::vector<DASearchRequest::Snippet> snippets;
+    request.GetTable(table);
+    request.GetIndex(name);
+    request.GetText(typed);
+    request.GetColumns(items);
+    request.GetSnippets(snippets);
+
+    const std::string index = kSearchPrefix + name;
+    std::string text = "SELECT ";
+    if (items.empty()) {
+        text += table + ".*, ";
+    }
+    AppendSelectList(text, items);
+    for (const auto& snippet : snippets) {
+        text += "ulo_hit." + snippet.as + ", ";
+    }
+    text.resize(text.size() - 2);
+    // The hits in a subquery of their own, so that the index's columns
+    // (named as the table's) never make the request's names ambiguous;
+    // SQLite flattens it into one join.
+    text += " FROM " + table + " JOIN (SELECT rowid AS ulo_rowid, rank AS ulo_rank";
+    for (const auto& snippet : snippets) {
+        // The column's place in the index, from the index itself; one it
+        // does not hold is out of range.
+        text += ", snippet(" + index + ", IFNULL((SELECT cid FROM pragma_table_info(";
+        AppendLiteral(text, index);
+        text += ") WHERE name=";
+        AppendLiteral(text, snippet.column);
+        text += "), 32767), ";
+        AppendLiteral(text, snippet.before);
+        text += ", ";
+        AppendLiteral(text, snippet.after);
+        text += ", '\xE2\x80\xA6', " + std::to_string(snippet.words) + ") AS " + snippet.as;
+    }
+    text += " FROM " + index + " WHERE " + index + " MATCH ";
+    AppendMatch(text, typed, request.GetPrefixLast(), index);
+    // Joined by rowid, so an entry whose row is gone (replaced under
+    // another key) finds nothing.
+    text += ") AS ulo_hit ON " + table + ".rowid = ulo_hit.ulo_rowid";
+    AppendWhere(text, request, false);
+    AppendQueryTail(text, request, "ulo_hit.ulo_rank");
+    sql = std::move(text);
 }

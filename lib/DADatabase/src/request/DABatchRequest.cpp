@@ -88,3 +88,8 @@ int DABatchRequest::Add(DAInsertRequest& request)
     }
     return rc;
 }
+
+int DABatchRequest::Add(DASearchIndexRequest& request)
+{
+    return AddStatement(request, &DASqlGenerator::GetCreateSearchIndexSql);
+}
