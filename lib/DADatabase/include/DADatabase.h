@@ -44,7 +44,10 @@ public:
     /// Opens dir/file under busy-retry. On 0, db is open and the caller
     /// closes it with sqlite3_close. Otherwise logs "DB open failed. Error
     /// no(rc): text", leaves db null and returns the code (14 when the
-    /// directory does not exist; no file is created then).
+    /// directory does not exist; no file is created then). A missing file
+    /// is created with mode 0640 less the umask: no access for other users
+    /// (its -journal, -wal and -shm files follow, SQLite giving them the
+    /// database file's mode); an existing file keeps its mode.
     int OpenDB(sqlite3*& db, std::string dir, std::string file);
 
     /// The busy-retry step: see DADatabaseParser::IsRetryLimit.

@@ -120,6 +120,12 @@ public:
     void SetSizeLimit(std::int64_t bytes);
     ///@}
 
+    /// The exact permission bits (e.g. 0600, 0660) of a database file the
+    /// next Open creates; its -journal, -wal and -shm files get the same
+    /// from SQLite. Default (or a negative mode): 0640 less the umask, no
+    /// access for other users. A file that exists keeps its mode.
+    void SetFileMode(int mode);
+
     /// Opens location's file (creating a missing file) under busy-retry, with
     /// the options set. An open session is closed first. Returns 0, or the
     /// code of the step that failed with the error line "DB open failed.

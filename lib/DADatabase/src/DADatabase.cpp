@@ -1,6 +1,7 @@
 #include "DADatabase.h"
 
 #include "DABusyRetry.h"
+#include "DAFiles.h"
 #include "DALog.h"
 #include "DAOperation.h"
 #include "DASqlGenerator.h"
@@ -40,6 +41,7 @@ int DADatabase::OpenDB(sqlite3*& db, std::string dir, std::string file)
     std::string path;
     DASqlGenerator generator;
     generator.GetDBPath(std::move(dir), std::move(file), path);
+    DACreateDatabaseFile(path, -1);  // private, before SQLite would create it 0644
 
     DAConnection handle;
     const int rc = DARetryWhileBusy(*this, [&] {

@@ -12,6 +12,7 @@
 #include <sqlite3.h>
 
 #include "DABusyRetry.h"
+#include "DAFiles.h"
 #include "DALocationRule.h"
 #include "DALog.h"
 #include "DAOperation.h"
@@ -47,6 +48,7 @@ struct DASessionState {
     bool wal = true;
     bool sync = true;
     std::int64_t sizeLimit = 0;
+    int fileMode = -1;  // -1: DACreateDatabaseFile's default
 
     DABasePath location;
     std::string path;
@@ -349,6 +351,12 @@ void DASession::SetSizeLimit(std::int64_t bytes)
     m_state->sizeLimit = bytes;
 }
 
+void DASession::SetFileMode(int mode)
+{
+    const std::unique_lock<std::shared_mutex> life(m_state->life);
+    m_state->fileMode = mode;
+}
+
 int DASession::Open(DABasePath& location)
 {
     const char* const func = "Open";
@@ -365,6 +373,7 @@ int DASession::Open(DABasePath& location)
 
     DASessionSource source(state, __LINE__);
     DAConnection writer;
+    DACreateDatabaseFile(state.path, state.fileMode);
     int rc = source.OpenConnection(state.path, kWriterFlags, func, writer);
     if (rc != SQLITE_OK) {
         return rc;
