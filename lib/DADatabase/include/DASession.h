@@ -3,6 +3,8 @@
 
 #include <cstdint>
 #include <memory>
+#include <string>
+#include <vector>
 
 #include "DAAddColumnRequest.h"
 #include "DABasePath.h"
@@ -184,6 +186,20 @@ public:
     int Insert(DAInsertRequest& request, std::int64_t& rowId);
     int Update(DAUpdateRequest& request, int& changes);
     int Delete(DADeleteRequest& request, int& changes);
+    ///@}
+
+    ///@{
+    /// DADatabase's Backup, Restore, CheckIntegrity and RebuildIndexes at
+    /// the session's file: codes, lines and files as stated in DADatabase.h.
+    /// Backup and CheckIntegrity read on a reader connection (with the log,
+    /// beside the session's writes, which never wait for them); Restore and
+    /// RebuildIndexes hold the writer. After a Restore every operation of
+    /// the session, reads on any of its connections included, sees the new
+    /// content and schema.
+    int Backup(DABasePath& to);
+    int Restore(DABasePath& from);
+    int CheckIntegrity(bool full, std::vector<std::string>& problems);
+    int RebuildIndexes();
     ///@}
 
 private:

@@ -177,3 +177,33 @@ int DADatabase::Delete(DADeleteRequest& request, int& changes)
     DAVisit visit(*this, __LINE__);
     return DAOperations::Delete(visit, request, changes);
 }
+
+int DADatabase::Backup(DABasePath& from, DABasePath& to)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Backup(visit, from, to);
+}
+
+int DADatabase::Restore(DABasePath& from, DABasePath& to)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Restore(visit, from, to);
+}
+
+int DADatabase::CheckIntegrity(DABasePath& location, bool full, std::vector<std::string>& problems)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::CheckIntegrity(visit, location, full, problems);
+}
+
+int DADatabase::RebuildIndexes(DABasePath& location)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::RebuildIndexes(visit, location);
+}
+
+int DADatabase::Salvage(DABasePath& from, DABasePath& to, DASalvageReport& report)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Salvage(visit, from, to, report);
+}

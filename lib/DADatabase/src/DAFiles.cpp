@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/statvfs.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -19,13 +20,22 @@ std::string SystemError(const char* what, const std::string& path)
     return std::string(what) + " " + path + ": " + std::strerror(errno);
 }
 
-std::string DirectoryOf(const std::string& path)
+}  // namespace
+
+std::string DADirectoryOf(const std::string& path)
 {
     const std::string::size_type slash = path.rfind('/');
     return slash == std::string::npos ? "." : slash == 0 ? "/" : path.substr(0, slash);
 }
 
-}  // namespace
+long long DAFreeBytes(const std::string& path)
+{
+    struct statvfs space {};
+    if (statvfs(DADirectoryOf(path).c_str(), &space) != 0) {
+        return -1;
+    }
+    return static_cast<long long>(space.f_bavail) * static_cast<long long>(space.f_frsize);
+}
 
 void DACreateDatabaseFile(const std::string& path, int mode)
 {
@@ -95,7 +105,7 @@ int DANewFile::Commit(std::string& error)
         return SQLITE_CANTOPEN;
     }
     m_path.clear();  // in place: no longer ours to remove
-    const int dir = open(DirectoryOf(m_to).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    const int dir = open(DADirectoryOf(m_to).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     const bool synced = dir >= 0 && fsync(dir) == 0;
     if (dir >= 0) {
         close(dir);

@@ -7,6 +7,9 @@
 
 #include <string>
 
+// The directory part of path ("." for a bare name).
+std::string DADirectoryOf(const std::string& path);
+
 // Creates path as an empty file (an empty database to SQLite) when nothing
 // is there yet; the one place that decides the mode of the database files
 // the library creates. mode < 0: 0640 less the umask (SQLite's 0644 less
@@ -20,6 +23,10 @@ void DACreateDatabaseFile(const std::string& path, int mode);
 
 // The permission bits of path, or -1 when it cannot be read.
 int DAFileModeOf(const std::string& path);
+
+// The bytes free to this process in the directory that holds path, or -1
+// when unknown.
+long long DAFreeBytes(const std::string& path);
 
 // True when a and b name the same existing file (device and inode).
 bool DAIsSameFile(const std::string& a, const std::string& b);

@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include <sqlite3.h>
 
@@ -23,6 +24,7 @@
 #include "DAInsertRequest.h"
 #include "DAJoinRequest.h"
 #include "DAQueryRequest.h"
+#include "DASalvageReport.h"
 #include "DASelectRequest.h"
 #include "DASqliteHandles.h"
 #include "DAUpdateRequest.h"
@@ -101,6 +103,27 @@ private:
     int m_line;
 };
 
+// Rolls back whatever transaction db still has open when it goes out of
+// scope: a failure, a stop, or an exception (std::bad_alloc) passing
+// through. A held connection must never carry a transaction into its next
+// operation, whose acknowledged write would then be lost with it.
+class DARollbackGuard {
+public:
+    explicit DARollbackGuard(sqlite3* db) : m_db(db) {}
+    ~DARollbackGuard()
+    {
+        // Some failures end the transaction inside SQLite already.
+        if (sqlite3_get_autocommit(m_db) == 0) {
+            sqlite3_exec(m_db, "ROLLBACK", nullptr, nullptr, nullptr);
+        }
+    }
+    DARollbackGuard(const DARollbackGuard&) = delete;
+    DARollbackGuard& operator=(const DARollbackGuard&) = delete;
+
+private:
+    sqlite3* m_db;
+};
+
 // Every operation, written once over any connection source: DADatabase
 // and DASession forward to these, each with its own source. Contracts,
 // codes and lines are those stated in DADatabase.h; the lines carry the
@@ -126,6 +149,13 @@ struct DAOperations {
     static int Insert(DAConnectionSource& source, DAInsertRequest& request, std::int64_t& rowId);
     static int Update(DAConnectionSource& source, DAUpdateRequest& request, int& changes);
     static int Delete(DAConnectionSource& source, DADeleteRequest& request, int& changes);
+    // Keeping files safe (DASafety.cpp).
+    static int Backup(DAConnectionSource& source, DABasePath& from, DABasePath& to);
+    static int Restore(DAConnectionSource& source, DABasePath& from, DABasePath& to);
+    static int CheckIntegrity(DAConnectionSource& source, DABasePath& location, bool full,
+                              std::vector<std::string>& problems);
+    static int RebuildIndexes(DAConnectionSource& source, DABasePath& location);
+    static int Salvage(DAConnectionSource& source, DABasePath& from, DABasePath& to, DASalvageReport& report);
 };
 
 #endif  // DAOPERATION_H

@@ -558,3 +558,35 @@ int DASession::Delete(DADeleteRequest& request, int& changes)
     DASessionCall source(*m_state, __LINE__);
     return DAOperations::Delete(source, request, changes);
 }
+
+int DASession::Backup(DABasePath& to)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    return DAOperations::Backup(source, here, to);
+}
+
+int DASession::Restore(DABasePath& from)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    const int rc = DAOperations::Restore(source, from, here);
+    ++m_state->generation;  // a new schema, as no authorizer sees
+    return rc;
+}
+
+int DASession::CheckIntegrity(bool full, std::vector<std::string>& problems)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    return DAOperations::CheckIntegrity(source, here, full, problems);
+}
+
+int DASession::RebuildIndexes()
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    const int rc = DAOperations::RebuildIndexes(source, here);
+    ++m_state->generation;
+    return rc;
+}
