@@ -1,4 +1,8 @@
 #include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <csignal>
 
 #include <algorithm>
 #include <filesystem>
@@ -13,6 +17,9 @@
 #include "TempDirTest.h"
 
 namespace {
+
+// Files on tmpfs where there is one: some cases commit many times.
+[[maybe_unused]] const bool g_onTmpfs = access("/dev/shm", W_OK) == 0 && setenv("TMPDIR", "/dev/shm", 1) == 0;
 
 int ModeOf(const std::string& path)
 {
@@ -170,3 +177,121 @@ TEST_P(Damaged, CheckRebuildAndSalvageGiveTheirResults)
 
 INSTANTIATE_TEST_SUITE_P(Every, Damaged, ::testing::ValuesIn(kDamages),
                          [](const auto& info) { return std::string(info.param.name); });
+
+namespace {
+
+// A table t of rows and n holding their count, changed together.
+const char* const kCounted = "CREATE TABLE t(k INTEGER PRIMARY KEY, v BLOB); CREATE TABLE n(c INTEGER);"
+                             "INSERT INTO n VALUES (0);";
+const char* const kOneMore = "BEGIN IMMEDIATE; INSERT INTO t(v) VALUES (randomblob(1000)); UPDATE n SET c = c + 1;"
+                             "COMMIT";
+std::string RowsOf(int count)
+{
+    return "WITH RECURSIVE i(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM i WHERE x < " + std::to_string(count) +
+        ") INSERT INTO t(v) SELECT randomblob(1000) FROM i; UPDATE n SET c = " + std::to_string(count) + ";";
+}
+// "ok|1" for a sound file whose count matches its rows: one committed state.
+const char* const kWholeState = "SELECT (SELECT * FROM pragma_quick_check), (SELECT c FROM n) = count(*) FROM t";
+
+// Runs body in a child process with its own connection to path (busy
+// time-out 5 s) until the parent ends it; returns its pid.
+template <typename Body>
+pid_t Child(const std::string& path, Body body)
+{
+    const pid_t pid = fork();
+    if (pid == 0) {
+        sqlite3* db = nullptr;
+        sqlite3_open(path.c_str(), &db);
+        sqlite3_busy_timeout(db, 5000);
+        body(db);
+        _exit(0);
+    }
+    return pid;
+}
+
+}  // namespace
+
+// While another process commits every millisecond (WAL), each backup holds
+// one committed state, and the writer goes on meanwhile.
+TEST_F(Safety, BackupOfALiveFileIsOneCommittedState)
+{
+    const std::string file = PathOf("t.db");
+    RawDb seed(file);
+    seed.Run(std::string("PRAGMA journal_mode = WAL;") + kCounted + RowsOf(2000));  // 2 MB: several steps
+    const pid_t writer = Child(file, [](sqlite3* db) {
+        for (;;) {
+            sqlite3_exec(db, kOneMore, nullptr, nullptr, nullptr);
+            usleep(1000);
+        }
+    });
+    DABasePath from;
+    DABasePath to;
+    At(from, Dir());
+    to.SetPath(Dir().c_str(), "copy.db");
+    const LogCapture quiet;
+    int counts[2] = {};
+    for (int& count : counts) {
+        usleep(100000);
+        ASSERT_EQ(0, DADatabase().Backup(from, to));
+        RawDb copy(PathOf("copy.db"));
+        EXPECT_EQ("ok|1", copy.Query(kWholeState));
+        count = std::stoi(copy.Query("SELECT c FROM n"));
+    }
+    kill(writer, SIGKILL);
+    waitpid(writer, nullptr, 0);
+    EXPECT_LT(counts[0], counts[1]);
+    EXPECT_EQ((Strings{"copy.db", "t.db", "t.db-shm", "t.db-wal"}), Listing(Dir()));
+}
+
+// Restores alternate between two backups while another process reads: it
+// sees one of them whole, never a mix, and a session holding the file reads
+// the restored rows at once.
+TEST_F(Safety, RestoreWhileAnotherProcessReadsShowsOldOrNew)
+{
+    for (const char* name : {"a.db", "b.db"}) {
+        RawDb backup(PathOf(name));
+        backup.Run(kCounted + RowsOf(name[0] == 'a' ? 100 : 300));
+    }
+    DASession session;
+    DABasePath location;
+    ASSERT_EQ(0, session.Open(At(location, Dir())));
+    int fds[2];
+    ASSERT_EQ(0, pipe(fds));
+    DABasePath backups[2];
+    backups[0].SetPath(Dir().c_str(), "a.db");
+    backups[1].SetPath(Dir().c_str(), "b.db");
+    const LogCapture quiet;
+    ASSERT_EQ(0, session.Restore(backups[0]));
+    const pid_t reader = Child(PathOf("t.db"), [&](sqlite3* db) {
+        std::string seen;
+        for (int i = 0; i < 1500; ++i) {
+            sqlite3_stmt* stmt = nullptr;
+            sqlite3_prepare_v2(db, "SELECT count(*) || '/' || (SELECT c FROM n) FROM t", -1, &stmt, nullptr);
+            const int rc = sqlite3_step(stmt);
+            const std::string row = rc == SQLITE_ROW ? reinterpret_cast<const char*>(sqlite3_column_text(stmt, 0))
+                                                     : "error " + std::to_string(rc);
+            sqlite3_finalize(stmt);
+            if (seen.find(row) == std::string::npos) {
+                seen += row + " ";
+            }
+        }
+        (void)!write(fds[1], seen.data(), seen.size());
+    });
+    close(fds[1]);
+    DASelectRequest select;
+    select.SetTable("t");
+    DACursor cursor;
+    int restores = 0;
+    for (; waitpid(reader, nullptr, WNOHANG) == 0; ++restores) {
+        const int which = restores % 2;
+        ASSERT_EQ(0,
+                  restores % 3 == 0 ? DADatabase().Restore(backups[which], location) : session.Restore(backups[which]));
+        ASSERT_EQ(0, session.Select(select, cursor));
+        EXPECT_EQ(which == 0 ? 100 : 300, cursor.GetCount());
+    }
+    std::string seen(64, '\0');
+    seen.resize(static_cast<std::size_t>(std::max<ssize_t>(read(fds[0], &seen[0], seen.size()), 0)));
+    close(fds[0]);
+    EXPECT_GT(restores, 2);
+    EXPECT_TRUE(seen == "100/100 300/300 " || seen == "300/300 100/100 ") << seen;
+}
