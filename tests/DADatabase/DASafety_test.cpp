@@ -295,3 +295,56 @@ TEST_F(Safety, RestoreWhileAnotherProcessReadsShowsOldOrNew)
     EXPECT_GT(restores, 2);
     EXPECT_TRUE(seen == "100/100 300/300 " || seen == "300/300 100/100 ") << seen;
 }
+
+// Refusals: each its code and one line; every file stays as it was and
+// nothing is left behind.
+TEST_F(Safety, RefusesBadInputWithOneLine)
+{
+    RawDb(PathOf("t.db")).Run(kCounted + RowsOf(10));
+    std::ofstream(PathOf("empty.db")).close();
+    std::ofstream(PathOf("text.db")) << std::string(5000, 'x');
+    std::string noise(8192, '\0');
+    for (std::size_t i = 0; i < noise.size(); ++i) {
+        noise[i] = static_cast<char>(i * 7919 % 251);
+    }
+    std::ofstream(PathOf("noise.db")) << noise;
+    std::ofstream(PathOf("cut.db")) << FileBytes(PathOf("t.db")).substr(0, 4096);
+    const Strings files = Listing(Dir());
+    const std::string before = FileBytes(PathOf("t.db"));
+    DABasePath t;
+    DABasePath missing;
+    At(t, Dir());
+    missing.SetPath(PathOf("missing").c_str(), "x.db");
+    DADatabase db;
+    DASalvageReport report;
+    LogCapture log;
+    std::string codes = std::to_string(db.Backup(t, missing));
+    codes += " " + std::to_string(db.Backup(t, t));
+    codes += " " + std::to_string(db.Salvage(t, missing, report));
+    codes += " " + std::to_string(db.Salvage(t, t, report));
+    for (const char* name : {"empty.db", "text.db", "noise.db", "cut.db", "gone.db", "t.db"}) {
+        DABasePath from;
+        from.SetPath(Dir().c_str(), name);
+        codes += " " + std::to_string(db.Restore(from, t));
+    }
+    EXPECT_EQ("14 21 14 21 26 26 26 11 14 21", codes);
+    const std::string beside = "cannot create a file beside " + Dir() + "/missing/x.db: No such file or directory";
+    const std::string itself = " would replace its own source " + Dir() + "/t.db";
+    const auto line = [](const char* function, const std::string& message) {
+        return Logged(6, "DADatabase.cpp", function, message);
+    };
+    EXPECT_EQ(
+        (Strings{line("Backup", "Backup FAILED[14]: " + beside), line("Backup", "Backup FAILED[21]: the copy" + itself),
+                 line("Salvage", "Salvage FAILED[14]: " + beside),
+                 line("Salvage", "Salvage FAILED[21]: the salvage" + itself),
+                 line("Restore", "Restore FAILED[26]: file is not a database"),
+                 line("Restore", "Restore FAILED[26]: file is not a database"),
+                 line("Restore", "Restore FAILED[26]: file is not a database"),
+                 line("Restore", "Restore FAILED[11]: database disk image is malformed"),
+                 line("Restore", "Restore FAILED[14]: unable to open database file"),
+                 line("Restore", "Restore FAILED[21]: restore of a file from itself: " + Dir() + "/t.db")}),
+        Described(log));
+    EXPECT_EQ(before, FileBytes(PathOf("t.db")));
+    EXPECT_EQ(files, Listing(Dir()));
+    EXPECT_TRUE(report.tables.empty());
+}

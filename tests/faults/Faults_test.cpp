@@ -392,6 +392,75 @@ TEST_F(Faults, SessionOnAFullDiskFailsCleanlyAndKeepsTheFile)
     EXPECT_EQ("20|ok", RawDb(PathOf("t.db")).Query("SELECT count(*), (SELECT * FROM pragma_integrity_check) FROM t"));
 }
 
+// A backup or salvage onto a full disk fails with 13 and leaves nothing
+// behind: the backup taken before stays as it was.
+TEST_F(Faults, BackupAndSalvageOnAFullDiskLeaveNothingBehind)
+{
+    RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); INSERT INTO t VALUES (1, 'a');");
+    DABasePath from;
+    DABasePath to;
+    DABasePath salvaged;
+    At(from, Dir());
+    to.SetPath(Dir().c_str(), "copy.db");
+    salvaged.SetPath(Dir().c_str(), "salvaged.db");
+    dlog_set_sink(&dlog_discard_sink, nullptr);
+    ASSERT_EQ(0, DADatabase().Backup(from, to));
+    const std::string previous = FileBytes(PathOf("copy.db"));
+    sqlite3_vfs* vfs = sqlite3_vfs_find(nullptr);
+    g_pwrite64 = vfs->xGetSystemCall(vfs, "pwrite64");
+    vfs->xSetSystemCall(vfs, "pwrite64", reinterpret_cast<sqlite3_syscall_ptr>(&FullDiskPwrite64));
+    LogCapture log;
+    DASalvageReport report;
+    EXPECT_EQ(13, DADatabase().Backup(from, to));
+    EXPECT_EQ(13, DADatabase().Salvage(from, salvaged, report));
+    vfs->xSetSystemCall(vfs, "pwrite64", g_pwrite64);
+    EXPECT_EQ((Strings{Logged(6, "DADatabase.cpp", "Backup", "Backup FAILED[13]: database or disk is full"),
+                       Logged(6, "DADatabase.cpp", "Salvage", "Salvage FAILED[13]: database or disk is full")}),
+              Described(log));
+    EXPECT_EQ(previous, FileBytes(PathOf("copy.db")));
+    EXPECT_EQ(2, std::distance(std::filesystem::directory_iterator(Dir()), {}));  // t.db and copy.db
+}
+
+// Backups of a changing file in a process killed at random moments, on a
+// file system that loses what was not synced: the backup is always a whole
+// file holding one committed state.
+TEST_F(Faults, PowerCutDuringBackupsLeavesAWholeBackup)
+{
+    RawDb(PathOf("t.db"))
+        .Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v BLOB); CREATE TABLE n(c INTEGER); "
+             "INSERT INTO n VALUES (0);");
+    std::mt19937 random(27);
+    for (int round = 0; round < 5; ++round) {
+        const pid_t pid = fork();
+        if (pid == 0) {
+            const faultfs::Installed fs;
+            dlog_set_sink(&dlog_discard_sink, nullptr);
+            RawDb db(PathOf("t.db"));
+            DABasePath from;
+            DABasePath to;
+            At(from, Dir());
+            to.SetPath(Dir().c_str(), "copy.db");
+            for (;;) {  // until killed
+                db.Run("BEGIN; INSERT INTO t(v) SELECT randomblob(3000) FROM t LIMIT 50; INSERT INTO t(v) VALUES "
+                       "(randomblob(3000)); UPDATE n SET c = (SELECT count(*) FROM t); COMMIT");
+                DADatabase().Backup(from, to);
+            }
+        }
+        ASSERT_GT(pid, 0);
+        usleep(std::uniform_int_distribution<useconds_t>(30000, 300000)(random));
+        kill(pid, SIGKILL);
+        waitpid(pid, nullptr, 0);
+        if (FileExists("copy.db")) {
+            EXPECT_EQ("ok|1",
+                      RawDb(PathOf("copy.db"))
+                          .Query("SELECT (SELECT * FROM pragma_quick_check), (SELECT c FROM n) = count(*) "
+                                 "FROM t"))
+                << round;
+        }
+    }
+    EXPECT_TRUE(FileExists("copy.db"));
+}
+
 TEST_F(Faults, KilledWriterLosesNoAcknowledgedRow)
 {
     RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT)");
