@@ -190,8 +190,8 @@ int main(int argc, char** argv)
     benchmark::AddCustomContext("sqlite_version", sqlite3_libversion());
     benchmark::AddCustomContext("compiler", __VERSION__);
     for (const bench::Location& location : ready ? locations : std::vector<bench::Location>{}) {
-        for (const auto cases :
-             {bench::ConditionCases, bench::QueryCases, bench::SchemaCases, bench::SessionCases, bench::WriteCases}) {
+        for (const auto cases : {bench::ConditionCases, bench::QueryCases, bench::SafetyCases, bench::SchemaCases,
+                                 bench::SessionCases, bench::WriteCases}) {
             cases(location);
         }
     }
