@@ -279,6 +279,10 @@ const IoCase kIoCases[] = {
      "13|6 DADatabase.cpp:Migrate > Migrate FAILED[13] at 1/1: database or disk is full"},
     {"CompactDiskFull", [](auto&, auto&) {},
      "13|6 DADatabase.cpp:Compact > Compact FAILED[13]: database or disk is full"},
+    // A backup or salvage (of the file into copy.db) leaves nothing behind.
+    {"BackupDiskFull", [](auto&, auto&) {}, "13|6 DADatabase.cpp:Backup > Backup FAILED[13]: database or disk is full"},
+    {"SalvageDiskFull", [](auto&, auto&) {},
+     "13|6 DADatabase.cpp:Salvage > Salvage FAILED[13]: database or disk is full"},
 };
 
 // SQLite's pwrite64 on a full file system: a write that would make a file
@@ -311,6 +315,7 @@ TEST_P(IoFaults, FailWithOneLineAndLeaveTheFile)
     }
     c.fault(dir, file);
     const std::string before = FileBytes(file);
+    const auto files = std::distance(std::filesystem::directory_iterator(dir), {});
     const pid_t pid = fork();
     if (pid == 0) {
         const bool nobody = getuid() != 0 || (setgroups(0, nullptr) == 0 && setgid(65534) == 0 && setuid(65534) == 0);
@@ -332,10 +337,15 @@ TEST_P(IoFaults, FailWithOneLineAndLeaveTheFile)
         step.SetPath(dir.c_str(), "t.db");
         step.Add(upsert);
         const auto named = [&](const char* word) { return std::strstr(c.expected, word) != nullptr; };
+        DABasePath copy;
+        copy.SetPath(dir.c_str(), "copy.db");
+        DASalvageReport report;
         out << (!nobody || access(Dir().c_str(), W_OK) != 0 ? -1
                     : named("SELECT")                       ? DADatabase().Select(At(select, dir, "t"), cursor)
                     : named("Migrate")                      ? DADatabase().Migrate(step, 1)
                     : named("Compact")                      ? DADatabase().Compact(upsert)
+                    : named("Backup")                       ? DADatabase().Backup(upsert, copy)
+                    : named("Salvage")                      ? DADatabase().Salvage(upsert, copy, report)
                                                             : DADatabase().Upsert(upsert));
         for (const std::string& line : Described(log)) {
             out << "|" << line;
@@ -350,6 +360,7 @@ TEST_P(IoFaults, FailWithOneLineAndLeaveTheFile)
     }
     EXPECT_EQ(c.expected, FileBytes(PathOf("out")));
     EXPECT_EQ(before, FileBytes(file));
+    EXPECT_EQ(files, std::distance(std::filesystem::directory_iterator(dir), {}));
 }
 
 INSTANTIATE_TEST_SUITE_P(Every, IoFaults, ::testing::ValuesIn(kIoCases),
@@ -390,35 +401,6 @@ TEST_F(Faults, SessionOnAFullDiskFailsCleanlyAndKeepsTheFile)
                        Logged(6, "DASession.cpp", "Delete", "delete FAILED[13]: database or disk is full")}),
               Described(log));
     EXPECT_EQ("20|ok", RawDb(PathOf("t.db")).Query("SELECT count(*), (SELECT * FROM pragma_integrity_check) FROM t"));
-}
-
-// A backup or salvage onto a full disk fails with 13 and leaves nothing
-// behind: the backup taken before stays as it was.
-TEST_F(Faults, BackupAndSalvageOnAFullDiskLeaveNothingBehind)
-{
-    RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); INSERT INTO t VALUES (1, 'a');");
-    DABasePath from;
-    DABasePath to;
-    DABasePath salvaged;
-    At(from, Dir());
-    to.SetPath(Dir().c_str(), "copy.db");
-    salvaged.SetPath(Dir().c_str(), "salvaged.db");
-    dlog_set_sink(&dlog_discard_sink, nullptr);
-    ASSERT_EQ(0, DADatabase().Backup(from, to));
-    const std::string previous = FileBytes(PathOf("copy.db"));
-    sqlite3_vfs* vfs = sqlite3_vfs_find(nullptr);
-    g_pwrite64 = vfs->xGetSystemCall(vfs, "pwrite64");
-    vfs->xSetSystemCall(vfs, "pwrite64", reinterpret_cast<sqlite3_syscall_ptr>(&FullDiskPwrite64));
-    LogCapture log;
-    DASalvageReport report;
-    EXPECT_EQ(13, DADatabase().Backup(from, to));
-    EXPECT_EQ(13, DADatabase().Salvage(from, salvaged, report));
-    vfs->xSetSystemCall(vfs, "pwrite64", g_pwrite64);
-    EXPECT_EQ((Strings{Logged(6, "DADatabase.cpp", "Backup", "Backup FAILED[13]: database or disk is full"),
-                       Logged(6, "DADatabase.cpp", "Salvage", "Salvage FAILED[13]: database or disk is full")}),
-              Described(log));
-    EXPECT_EQ(previous, FileBytes(PathOf("copy.db")));
-    EXPECT_EQ(2, std::distance(std::filesystem::directory_iterator(Dir()), {}));  // t.db and copy.db
 }
 
 // Backups of a changing file in a process killed at random moments, on a
