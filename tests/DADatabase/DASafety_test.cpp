@@ -286,18 +286,21 @@ TEST_F(Safety, RefusesBadInputWithOneLine)
     std::ofstream(PathOf("text.db")) << std::string(5000, 'x');
     std::ofstream(PathOf("noise.db")) << std::string(4096, '\x93') + std::string(4096, '\x11');
     std::ofstream(PathOf("cut.db")) << FileBytes(PathOf("t.db")).substr(0, 4096);
+    std::ofstream(PathOf("held.db-wal")).close();  // a log its next opener would apply
     const Strings files = Listing(Dir());
     const std::string before = FileBytes(PathOf("t.db"));
     DABasePath t;
     DABasePath missing;
     At(t, Dir());
     missing.SetPath(PathOf("missing").c_str(), "x.db");
+    DABasePath held;
+    held.SetPath(Dir().c_str(), "held.db");
     DADatabase db;
     DASalvageReport report;
     LogCapture log;
     std::string codes;
-    for (const int rc :
-         {db.Backup(t, missing), db.Backup(t, t), db.Salvage(t, missing, report), db.Salvage(t, t, report)}) {
+    for (const int rc : {db.Backup(t, missing), db.Backup(t, t), db.Salvage(t, missing, report),
+                         db.Salvage(t, t, report), db.Backup(t, held)}) {
         codes += std::to_string(rc) + " ";  // a braced list runs in order
     }
     for (const char* name : {"empty.db", "text.db", "noise.db", "cut.db", "gone.db", "t.db"}) {
@@ -305,7 +308,7 @@ TEST_F(Safety, RefusesBadInputWithOneLine)
         from.SetPath(Dir().c_str(), name);
         codes += std::to_string(db.Restore(from, t)) + " ";
     }
-    EXPECT_EQ("14 21 14 21 26 26 26 11 14 21 ", codes);
+    EXPECT_EQ("14 21 14 21 5 26 26 26 11 14 21 ", codes);
     const std::string beside = "cannot create a file beside " + Dir() + "/missing/x.db: No such file or directory";
     const std::string itself = " would replace its own source " + Dir() + "/t.db";
     const auto line = [](const char* function, const std::string& message) {
@@ -315,6 +318,7 @@ TEST_F(Safety, RefusesBadInputWithOneLine)
         (Strings{line("Backup", "Backup FAILED[14]: " + beside), line("Backup", "Backup FAILED[21]: the copy" + itself),
                  line("Salvage", "Salvage FAILED[14]: " + beside),
                  line("Salvage", "Salvage FAILED[21]: the salvage" + itself),
+                 line("Backup", "Backup FAILED[5]: " + Dir() + "/held.db is in use: " + Dir() + "/held.db-wal exists"),
                  line("Restore", "Restore FAILED[26]: file is not a database"),
                  line("Restore", "Restore FAILED[26]: file is not a database"),
                  line("Restore", "Restore FAILED[26]: file is not a database"),

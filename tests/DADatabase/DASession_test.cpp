@@ -210,6 +210,7 @@ const OperationCase kOperations[] = {
                   ? s->CheckIntegrity(true, problems) + s->RebuildIndexes() + s->Restore(copy)
                   : t.db->CheckIntegrity(at, true, problems) + t.db->RebuildIndexes(at) + t.db->Restore(copy, at));
          rc = rc * 100 + (s != nullptr ? s->Backup(at) : t.db->Backup(at, at));  // onto itself: 21
+         rc = rc * 10 + (s != nullptr ? s->Backup(copy) : t.db->Backup(at, copy));  // the restore left no log
          return rc * 10 + RUN(t, Select, Make(select, dir, "contacts"), cursor) + static_cast<int>(problems.size());
      }},
     {"batch",

@@ -193,7 +193,9 @@ public:
     /// SUCCESS[0]: <pages> pages" (info) or "Backup FAILED[rc]: text"
     /// (error). Fails, leaving nothing behind and to as it was, with 13 when
     /// the disk (or the file-size limit) has no room for the copy, 14 when
-    /// to's directory is missing, 21 when to is from's file itself. The open
+    /// to's directory is missing, 21 when to is from's file itself, 5 when
+    /// to has a "-wal" or "-journal" beside it (it is in use, or was left
+    /// mid-transaction: its next opener would apply that to the copy). The open
     /// of from is OpenDB's (its lines and code; a missing from is created
     /// empty, as by every visit).
     int Backup(DABasePath& from, DABasePath& to);

@@ -46,8 +46,9 @@ public:
     // 0, or SQLITE_CANTOPEN (14) with error set (the directory is missing
     // or not writable).
     int Create(const std::string& to, int mode, std::string& error);
-    // The temporary file's path.
+    // The temporary file's path and its descriptor (open for writing).
     const std::string& Path() const { return m_path; }
+    int Descriptor() const { return m_fd; }
     // 0, or SQLITE_IOERR (10) / SQLITE_CANTOPEN (14) with error set; the
     // temporary file is then removed as on any failure.
     int Commit(std::string& error);

@@ -1,6 +1,8 @@
 // Keeping files safe: backups, restores, integrity checks, index rebuilds
 // and salvage, in the frame of every operation (DAOperation.h).
 
+#include <unistd.h>
+
 #include <cerrno>
 #include <cstdint>
 #include <limits>
@@ -136,6 +138,20 @@ bool OutOfRoom(int rc, int systemErrno)
         ((rc & 0xff) == SQLITE_IOERR && (systemErrno == EFBIG || systemErrno == EDQUOT || systemErrno == ENOSPC));
 }
 
+// A copy of a file in WAL mode says so in its header (bytes 18 and 19 are
+// 2), and then every reader, a read-only one too, leaves -wal and -shm
+// files beside it. The new file, with no log, becomes a rollback-journal
+// file (1 and 1); a restore into a WAL file keeps that file in WAL mode.
+void MarkRollbackJournal(int fd)
+{
+    constexpr off_t kVersionBytes = 18;
+    unsigned char version[2] = {};
+    if (pread(fd, version, sizeof version, kVersionBytes) == sizeof version && version[0] == 2 && version[1] == 2) {
+        const unsigned char legacy[2] = {1, 1};
+        (void)!pwrite(fd, legacy, sizeof legacy, kVersionBytes);
+    }
+}
+
 // Writes a new database file at toPath with exactly mode: beside it first,
 // fill(dest, error) writing on a connection of its own (no journal: on a
 // failure the whole file goes; synced at its commit), quick-checked,
@@ -144,6 +160,14 @@ bool OutOfRoom(int rc, int systemErrno)
 template <typename Fill>
 int WriteNewFile(DAConnectionSource& source, const std::string& toPath, int mode, std::string& error, Fill fill)
 {
+    // A log or journal of to would be applied to the new file by its next
+    // opener: to is in use, or was left mid-transaction.
+    for (const char* suffix : {"-wal", "-journal"}) {
+        if (DAFileModeOf(toPath + suffix) >= 0) {
+            error = toPath + " is in use: " + toPath + suffix + " exists";
+            return SQLITE_BUSY;
+        }
+    }
     DANewFile file;
     int rc = file.Create(toPath, mode, error);
     if (rc != SQLITE_OK) {
@@ -173,6 +197,9 @@ int WriteNewFile(DAConnectionSource& source, const std::string& toPath, int mode
             rc = SQLITE_FULL;
             error = sqlite3_errstr(rc);
         }
+    }
+    if (rc == SQLITE_OK) {
+        MarkRollbackJournal(file.Descriptor());
     }
     return rc == SQLITE_OK ? file.Commit(error) : rc;
 }
