@@ -164,7 +164,8 @@ int WriteNewFile(DAConnectionSource& source, const std::string& toPath, int mode
     // opener: to is in use, or was left mid-transaction.
     for (const char* suffix : {"-wal", "-journal"}) {
         if (DAFileModeOf(toPath + suffix) >= 0) {
-            error = toPath + " is in use: " + toPath + suffix + " exists";
+            error = toPath;
+            error.append(" is in use: ").append(toPath).append(suffix).append(" exists");
             return SQLITE_BUSY;
         }
     }
