@@ -190,8 +190,9 @@ int main(int argc, char** argv)
     benchmark::AddCustomContext("sqlite_version", sqlite3_libversion());
     benchmark::AddCustomContext("compiler", __VERSION__);
     for (const bench::Location& location : ready ? locations : std::vector<bench::Location>{}) {
-        for (const auto cases : {bench::ConditionCases, bench::QueryCases, bench::SchemaCases, bench::SearchCases,
-                                 bench::SessionCases, bench::TypedCases, bench::WatchCases, bench::WriteCases}) {
+        for (const auto cases :
+             {bench::ConditionCases, bench::QueryCases, bench::SafetyCases, bench::SchemaCases, bench::SearchCases,
+              bench::SessionCases, bench::TypedCases, bench::WatchCases, bench::WriteCases}) {
             cases(location);
         }
     }

@@ -35,6 +35,7 @@ benchmark::internal::Benchmark* Add(const std::string& name, Op op, Counters cou
 void ConditionCases(const Location& at);
 void NameCases();
 void QueryCases(const Location& at);
+void SafetyCases(const Location& at);
 void SchemaCases(const Location& at);
 void SearchCases(const Location& at);
 void SessionCases(const Location& at);

@@ -17,7 +17,7 @@ LOCATIONS = ("tmpfs", "disk", "memory")
 # (title, section prefixes): one table each; docs/benchmarks.md says what each measures.
 SECTIONS = [("Write operations", ["write"]), ("Batches", ["batch"]), ("Queries", ["select", "join", "page", "exist"]),
             ("Reading a cursor", ["walk"]), ("Names", ["lock", "intern", "memory"]), ("Conditions", ["cond"]),
-            ("Schema", ["schema"]), ("Sessions", ["session"]),
+            ("Schema", ["schema"]), ("Sessions", ["session"]), ("Safety", ["safety"]),
             ("Typed reads", ["typed"]), ("Watching", ["watch"]), ("Search", ["search"])]
 
 
@@ -115,6 +115,14 @@ TARGETS = [
     one("10k inserts in batches of 100 into an indexed table: lib / raw", "search/Insert10000/tmpfs/lib", "raw",
         "<=", 1.3),
     ("session held (KiB beyond the page cache)", of("session/Select/tmpfs/lib", "held_bytes", 1024), "<=", 1024),
+    *both("backup of 53k messages beside a writer, {l}: lib / raw `backup_step(-1)`", "safety/Backup53000/{l}/lib",
+          "raw", "<=", 2),
+    *[(f"backup, {l}: the writer's longest commit (ms)", of(f"safety/Backup53000/{l}/lib", "writer_wait_ms", 1), "<=",
+       50) for l in LOCATIONS[:2]],
+    *[(f"salvage, one damaged page, {l}: rows not on it and not recovered", lambda r, c=f"safety/Salvage53000/{l}/lib":
+       r(c, "rows_not_on_page") - r(c, "rows_recovered"), "<=", 0) for l in LOCATIONS[:2]],
+    *both("salvage, {l}: lib / a full `Query`", "safety/Salvage53000/{l}/lib", "query", "<=", 3),
+    *both("quick check, {l}: lib / raw", "safety/QuickCheck53000/{l}/lib", "raw", "<=", 1.2),
 ]
 
 
@@ -123,7 +131,8 @@ def load(path):
     data, samples = json.load(open(path)), defaultdict(list)
     for run in data["benchmarks"]:
         if run.get("run_type") == "iteration" and not run.get("error_occurred"):
-            sample = {k: v for k, v in run.items() if k in ("rows", "statements", "wakeups") or k.endswith(("_bytes", "_ms"))}
+            sample = {k: v for k, v in run.items() if k in ("rows", "statements", "wakeups") or k.endswith(("_bytes", "_ms"))
+                      or k.startswith("rows_")}
             sample["real"] = run["real_time"] * {"ns": 1e-3, "us": 1.0, "ms": 1e3, "s": 1e6}[run["time_unit"]]
             samples["/".join(run["run_name"].split("/")[:4])].append(sample)
     return data.get("context", {}), samples

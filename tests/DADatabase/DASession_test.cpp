@@ -263,6 +263,26 @@ const OperationCase kOperations[] = {
              (t.session != nullptr ? t.session->Unwatch("contacts") * 10 + t.session->Unwatch("a b")
                                    : t.db->Unwatch(at, "contacts") * 10 + t.db->Unwatch(at, "a b"));
      }},
+    {"backup_check_rebuild_restore",  // the restored rows read at once, on every connection
+     [](Target& t, const std::string& dir, DACursor& cursor) {
+         DABasePath at;
+         DABasePath copy;
+         At(at, dir);
+         copy.SetPath(dir.c_str(), "copy.db");
+         DADeleteRequest remove;
+         DASelectRequest select;
+         std::vector<std::string> problems;
+         DASession* s = t.session;
+         int rc = s != nullptr ? s->Backup(copy) : t.db->Backup(at, copy);
+         rc = rc * 10 + RUN(t, Delete, At(remove, dir, "contacts"));  // every row, back with the restore
+         rc = rc * 10 +
+             (s != nullptr
+                  ? s->CheckIntegrity(true, problems) + s->RebuildIndexes() + s->Restore(copy)
+                  : t.db->CheckIntegrity(at, true, problems) + t.db->RebuildIndexes(at) + t.db->Restore(copy, at));
+         rc = rc * 100 + (s != nullptr ? s->Backup(at) : t.db->Backup(at, at));  // onto itself: 21
+         rc = rc * 10 + (s != nullptr ? s->Backup(copy) : t.db->Backup(at, copy));  // the restore left no log
+         return rc * 10 + RUN(t, Select, Make(select, dir, "contacts"), cursor) + static_cast<int>(problems.size());
+     }},
     {"batch",
      [](Target& t, const std::string& dir, DACursor&) {
          DABatchRequest batch;

@@ -279,6 +279,10 @@ const IoCase kIoCases[] = {
      "13|6 DADatabase.cpp:Migrate > Migrate FAILED[13] at 1/1: database or disk is full"},
     {"CompactDiskFull", [](auto&, auto&) {},
      "13|6 DADatabase.cpp:Compact > Compact FAILED[13]: database or disk is full"},
+    // A backup or salvage (of the file into copy.db) leaves nothing behind.
+    {"BackupDiskFull", [](auto&, auto&) {}, "13|6 DADatabase.cpp:Backup > Backup FAILED[13]: database or disk is full"},
+    {"SalvageDiskFull", [](auto&, auto&) {},
+     "13|6 DADatabase.cpp:Salvage > Salvage FAILED[13]: database or disk is full"},
 };
 
 // SQLite's pwrite64 on a full file system: a write that would make a file
@@ -311,6 +315,7 @@ TEST_P(IoFaults, FailWithOneLineAndLeaveTheFile)
     }
     c.fault(dir, file);
     const std::string before = FileBytes(file);
+    const auto files = std::distance(std::filesystem::directory_iterator(dir), {});
     const pid_t pid = fork();
     if (pid == 0) {
         const bool nobody = getuid() != 0 || (setgroups(0, nullptr) == 0 && setgid(65534) == 0 && setuid(65534) == 0);
@@ -332,10 +337,15 @@ TEST_P(IoFaults, FailWithOneLineAndLeaveTheFile)
         step.SetPath(dir.c_str(), "t.db");
         step.Add(upsert);
         const auto named = [&](const char* word) { return std::strstr(c.expected, word) != nullptr; };
+        DABasePath copy;
+        copy.SetPath(dir.c_str(), "copy.db");
+        DASalvageReport report;
         out << (!nobody || access(Dir().c_str(), W_OK) != 0 ? -1
                     : named("SELECT")                       ? DADatabase().Select(At(select, dir, "t"), cursor)
                     : named("Migrate")                      ? DADatabase().Migrate(step, 1)
                     : named("Compact")                      ? DADatabase().Compact(upsert)
+                    : named("Backup")                       ? DADatabase().Backup(upsert, copy)
+                    : named("Salvage")                      ? DADatabase().Salvage(upsert, copy, report)
                                                             : DADatabase().Upsert(upsert));
         for (const std::string& line : Described(log)) {
             out << "|" << line;
@@ -350,6 +360,7 @@ TEST_P(IoFaults, FailWithOneLineAndLeaveTheFile)
     }
     EXPECT_EQ(c.expected, FileBytes(PathOf("out")));
     EXPECT_EQ(before, FileBytes(file));
+    EXPECT_EQ(files, std::distance(std::filesystem::directory_iterator(dir), {}));
 }
 
 INSTANTIATE_TEST_SUITE_P(Every, IoFaults, ::testing::ValuesIn(kIoCases),
@@ -390,6 +401,46 @@ TEST_F(Faults, SessionOnAFullDiskFailsCleanlyAndKeepsTheFile)
                        Logged(6, "DASession.cpp", "Delete", "delete FAILED[13]: database or disk is full")}),
               Described(log));
     EXPECT_EQ("20|ok", RawDb(PathOf("t.db")).Query("SELECT count(*), (SELECT * FROM pragma_integrity_check) FROM t"));
+}
+
+// Backups of a changing file in a process killed at random moments, on a
+// file system that loses what was not synced: the backup is always a whole
+// file holding one committed state.
+TEST_F(Faults, PowerCutDuringBackupsLeavesAWholeBackup)
+{
+    RawDb(PathOf("t.db"))
+        .Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v BLOB); CREATE TABLE n(c INTEGER); "
+             "INSERT INTO n VALUES (0);");
+    std::mt19937 random(27);
+    for (int round = 0; round < 5; ++round) {
+        const pid_t pid = fork();
+        if (pid == 0) {
+            const faultfs::Installed fs;
+            dlog_set_sink(&dlog_discard_sink, nullptr);
+            RawDb db(PathOf("t.db"));
+            DABasePath from;
+            DABasePath to;
+            At(from, Dir());
+            to.SetPath(Dir().c_str(), "copy.db");
+            for (;;) {  // until killed
+                db.Run("BEGIN; INSERT INTO t(v) SELECT randomblob(3000) FROM t LIMIT 50; INSERT INTO t(v) VALUES "
+                       "(randomblob(3000)); UPDATE n SET c = (SELECT count(*) FROM t); COMMIT");
+                DADatabase().Backup(from, to);
+            }
+        }
+        ASSERT_GT(pid, 0);
+        usleep(std::uniform_int_distribution<useconds_t>(30000, 300000)(random));
+        kill(pid, SIGKILL);
+        waitpid(pid, nullptr, 0);
+        if (FileExists("copy.db")) {
+            EXPECT_EQ("ok|1",
+                      RawDb(PathOf("copy.db"))
+                          .Query("SELECT (SELECT * FROM pragma_quick_check), (SELECT c FROM n) = count(*) "
+                                 "FROM t"))
+                << round;
+        }
+    }
+    EXPECT_TRUE(FileExists("copy.db"));
 }
 
 TEST_F(Faults, KilledWriterLosesNoAcknowledgedRow)

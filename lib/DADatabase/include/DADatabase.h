@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <functional>
 #include <string>
+#include <vector>
 
 #include <sqlite3.h>
 
@@ -21,6 +22,7 @@
 #include "DARow.h"
 #include "DASearchIndexRequest.h"
 #include "DASearchRequest.h"
+#include "DASalvageReport.h"
 #include "DASelectRequest.h"
 #include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
@@ -49,7 +51,10 @@ public:
     /// Opens dir/file under busy-retry. On 0, db is open and the caller
     /// closes it with sqlite3_close. Otherwise logs "DB open failed. Error
     /// no(rc): text", leaves db null and returns the code (14 when the
-    /// directory does not exist; no file is created then).
+    /// directory does not exist; no file is created then). A missing file
+    /// is created with mode 0640 less the umask: no access for other users
+    /// (its -journal, -wal and -shm files follow, SQLite giving them the
+    /// database file's mode); an existing file keeps its mode.
     int OpenDB(sqlite3*& db, std::string dir, std::string file);
 
     /// The busy-retry step: see DADatabaseParser::IsRetryLimit.
@@ -247,6 +252,83 @@ public:
     /// null or non-plain table name returns 21 with the one line "Unwatch
     /// FAILED[21]: table name is not a plain name", nothing opened.
     int Unwatch(DABasePath& location, char const* table);
+    /// Copies from's file into a new file at to: one committed state of the
+    /// whole file, taken with SQLite's online backup while other connections
+    /// go on writing. The copy reads one snapshot from start to end, in
+    /// steps of 256 pages (about 1 ms each): in write-ahead-log mode no
+    /// writer ever waits for it; in rollback mode a writer's commit waits
+    /// while it reads, and gives up with 5 after the busy-retry rule's time.
+    /// Written to "<to>.XXXXXX" beside to (created with from's mode less
+    /// every permission for others), synced, passed through "PRAGMA
+    /// quick_check", renamed over to, and the directory synced: after a
+    /// power cut to is the previous file or the whole copy. Logs "Backup
+    /// SUCCESS[0]: <pages> pages" (info) or "Backup FAILED[rc]: text"
+    /// (error). Fails, leaving nothing behind and to as it was, with 13 when
+    /// the disk (or the file-size limit) has no room for the copy, 14 when
+    /// to's directory is missing, 21 when to is from's file itself, 5 when
+    /// to has a "-wal" or "-journal" beside it (it is in use, or was left
+    /// mid-transaction: its next opener would apply that to the copy). The open
+    /// of from is OpenDB's (its lines and code; a missing from is created
+    /// empty, as by every visit).
+    int Backup(DABasePath& from, DABasePath& to);
+
+    /// Replaces the content of to's file by that of the database file at
+    /// from, through SQLite's locking (online backup into the live file, one
+    /// transaction): every other connection, of this process or another,
+    /// sees the old content or the new, never a mix; sessions holding the
+    /// file go on with the new content. from is opened read-only and must be
+    /// a whole, intact database (its quick check finds nothing): otherwise
+    /// its code is returned (14 missing, 26 not a database or empty, 11
+    /// damaged or truncated) and to is untouched; 21 when from is to's file
+    /// itself; 8 when to is in WAL mode with another page size than from.
+    /// Writers of to meet the busy-retry rule. Lines "Restore SUCCESS[0]:
+    /// <pages> pages" / "Restore FAILED[rc]: text"; OpenDB's for to.
+    int Restore(DABasePath& from, DABasePath& to);
+
+    /// Checks location's file: "PRAGMA quick_check" (full false: page
+    /// structure, records, NOT NULL) or "PRAGMA integrity_check" (also that
+    /// every index matches its table). Returns 0 with problems empty for a
+    /// sound file, or 0 with SQLite's messages (at most 100, one per line of
+    /// its report) for a damaged one, also when the check itself stops with
+    /// 11 after them; logs "CheckIntegrity SUCCESS[0]: <n> problems" (info
+    /// for none, error otherwise). When the check cannot run, returns the
+    /// code with problems holding one message: 14 (OpenDB's line), 26 not a
+    /// database, 11 a file SQLite cannot read as one (a damaged first
+    /// page), with "CheckIntegrity FAILED[rc]: text".
+    int CheckIntegrity(DABasePath& location, bool full, std::vector<std::string>& problems);
+
+    /// Rebuilds every index of location's file from its table ("REINDEX").
+    /// Where an index has a damaged page (REINDEX, DROP INDEX and VACUUM
+    /// all fail there with 11), every index with a CREATE statement is
+    /// taken out of the schema and created anew from its table in one
+    /// transaction (PRAGMA writable_schema, never left on), then "VACUUM"
+    /// frees the pages the old ones held: every query works again and the
+    /// file passes both checks. Needs the table pages intact; indexes of
+    /// UNIQUE and PRIMARY KEY constraints are rebuilt by REINDEX only.
+    /// VACUUM needs room of up to twice the file (13 otherwise, the indexes
+    /// then already rebuilt). Lines "RebuildIndexes SUCCESS[0]: <n>
+    /// recreated" (0 when REINDEX sufficed) / "RebuildIndexes FAILED[rc]:
+    /// text".
+    int RebuildIndexes(DABasePath& location);
+
+    /// Copies what can still be read of a damaged file at from into a new
+    /// file at to, written as Backup writes (beside to, with from's mode
+    /// less others' permissions, synced, checked, renamed; nothing left on a
+    /// failure): from's schema (tables, then their rows, then indexes,
+    /// triggers and views; user_version and page size) and, table by table
+    /// in rowid order, every row that reads; past a damaged page the copy
+    /// seeks the next rowid that reads again, so a damaged page costs the
+    /// rows it holds. report (replaced on success, untouched on failure)
+    /// lists each table with its rows copied and lost: 0 when the table
+    /// read whole, the shortfall against count(*) where that still reads
+    /// (through an index), else -1. A WITHOUT ROWID table is copied up to
+    /// its first damaged page; virtual tables are not recreated. from is
+    /// opened read-only and never written (14 when missing). A damaged
+    /// first page takes the schema with it: Salvage then returns 26 or 11
+    /// and creates nothing. 21 when to is from's file. Lines "Salvage
+    /// SUCCESS[0]: <rows> rows, <lost> lost" (-1: not known for every
+    /// table) / "Salvage FAILED[rc]: text".
+    int Salvage(DABasePath& from, DABasePath& to, DASalvageReport& report);
 };
 
 #endif  // DADATABASE_H

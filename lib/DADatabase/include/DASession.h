@@ -4,6 +4,8 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <string>
+#include <vector>
 
 #include "DAAddColumnRequest.h"
 #include "DABasePath.h"
@@ -135,6 +137,12 @@ public:
     void SetCreate(bool create);
     ///@}
 
+    /// The exact permission bits (e.g. 0600, 0660) of a database file the
+    /// next Open creates; its -journal, -wal and -shm files get the same
+    /// from SQLite. Default (or a negative mode): 0640 less the umask, no
+    /// access for other users. A file that exists keeps its mode.
+    void SetFileMode(int mode);
+
     /// Opens location's file (creating a missing file) under busy-retry, with
     /// the options set. An open session is closed first. Returns 0, or the
     /// code of the step that failed with the error line "DB open failed.
@@ -220,6 +228,19 @@ public:
     /// DADatabase::Unwatch at the session's file: codes and lines as stated
     /// there.
     int Unwatch(char const* table);
+
+    /// DADatabase's Backup, Restore, CheckIntegrity and RebuildIndexes at
+    /// the session's file: codes, lines and files as stated in DADatabase.h.
+    /// Backup and CheckIntegrity read on a reader connection (with the log,
+    /// beside the session's writes, which never wait for them); Restore and
+    /// RebuildIndexes hold the writer. After a Restore every operation of
+    /// the session, reads on any of its connections included, sees the new
+    /// content and schema.
+    int Backup(DABasePath& to);
+    int Restore(DABasePath& from);
+    int CheckIntegrity(bool full, std::vector<std::string>& problems);
+    int RebuildIndexes();
+    ///@}
 
 private:
     std::unique_ptr<DASessionState> m_state;

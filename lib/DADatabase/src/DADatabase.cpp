@@ -1,6 +1,7 @@
 #include "DADatabase.h"
 
 #include "DABusyRetry.h"
+#include "DAFiles.h"
 #include "DALog.h"
 #include "DAOperation.h"
 #include "DASqlGenerator.h"
@@ -40,6 +41,7 @@ int DADatabase::OpenDB(sqlite3*& db, std::string dir, std::string file)
     std::string path;
     DASqlGenerator generator;
     generator.GetDBPath(std::move(dir), std::move(file), path);
+    DACreateDatabaseFile(path, -1);  // private, before SQLite would create it 0644
 
     DAConnection handle;
     const int rc = DARetryWhileBusy(*this, [&] {
@@ -223,4 +225,34 @@ int DADatabase::Unwatch(DABasePath& location, char const* table)
 {
     DAVisit visit(*this, __LINE__);
     return DAOperations::Unwatch(visit, location, table);
+}
+
+int DADatabase::Backup(DABasePath& from, DABasePath& to)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Backup(visit, from, to);
+}
+
+int DADatabase::Restore(DABasePath& from, DABasePath& to)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Restore(visit, from, to);
+}
+
+int DADatabase::CheckIntegrity(DABasePath& location, bool full, std::vector<std::string>& problems)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::CheckIntegrity(visit, location, full, problems);
+}
+
+int DADatabase::RebuildIndexes(DABasePath& location)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::RebuildIndexes(visit, location);
+}
+
+int DADatabase::Salvage(DABasePath& from, DABasePath& to, DASalvageReport& report)
+{
+    DAVisit visit(*this, __LINE__);
+    return DAOperations::Salvage(visit, from, to, report);
 }

@@ -191,27 +191,6 @@ int VisitRow(void* user, sqlite3_stmt* stmt)
 // with step where it stopped (0 the begin or decide, 1..count the
 // statements, count + 1 finish or the commit) and error the text of a
 // failed exec.
-// Rolls back whatever transaction db still has open when it goes out of
-// scope: a failure, a stop, or an exception (std::bad_alloc) passing
-// through. A held connection must never carry a transaction into its next
-// operation, whose acknowledged write would then be lost with it.
-class DARollbackGuard {
-public:
-    explicit DARollbackGuard(sqlite3* db) : m_db(db) {}
-    ~DARollbackGuard()
-    {
-        // Some failures end the transaction inside SQLite already.
-        if (sqlite3_get_autocommit(m_db) == 0) {
-            sqlite3_exec(m_db, "ROLLBACK", nullptr, nullptr, nullptr);
-        }
-    }
-    DARollbackGuard(const DARollbackGuard&) = delete;
-    DARollbackGuard& operator=(const DARollbackGuard&) = delete;
-
-private:
-    sqlite3* m_db;
-};
-
 struct NoStatementFollowUp {
     void operator()(int /*step*/) const {}
 };

@@ -10,6 +10,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include <sqlite3.h>
 
@@ -27,6 +28,7 @@
 #include "DARow.h"
 #include "DASearchIndexRequest.h"
 #include "DASearchRequest.h"
+#include "DASalvageReport.h"
 #include "DASelectRequest.h"
 #include "DASqliteHandles.h"
 #include "DATypedCursor.h"
@@ -107,6 +109,31 @@ private:
     int m_line;
 };
 
+// Rolls back whatever transaction db still has open when it goes out of
+// scope: a failure, a stop, or an exception (std::bad_alloc) passing
+// through. A held connection must never carry a transaction into its next
+// operation, whose acknowledged write would then be lost with it.
+class DARollbackGuard {
+public:
+    static constexpr int kRollbackAttempts = 3;
+
+    explicit DARollbackGuard(sqlite3* db) : m_db(db) {}
+    ~DARollbackGuard()
+    {
+        // Some failures end the transaction inside SQLite already. The
+        // ROLLBACK itself needs a little memory to be prepared: it is tried
+        // again when it could not get it.
+        for (int attempt = 0; attempt < kRollbackAttempts && sqlite3_get_autocommit(m_db) == 0; ++attempt) {
+            sqlite3_exec(m_db, "ROLLBACK", nullptr, nullptr, nullptr);
+        }
+    }
+    DARollbackGuard(const DARollbackGuard&) = delete;
+    DARollbackGuard& operator=(const DARollbackGuard&) = delete;
+
+private:
+    sqlite3* m_db;
+};
+
 // Every operation, written once over any connection source: DADatabase
 // and DASession forward to these, each with its own source. Contracts,
 // codes and lines are those stated in DADatabase.h; the lines carry the
@@ -157,6 +184,13 @@ struct DAOperations {
     // Removes table's triggers and counter, and the counter table with the
     // last counter: contract in DADatabase.h (Unwatch).
     static int Unwatch(DAConnectionSource& source, DABasePath& location, char const* table);
+    // Keeping files safe (DASafety.cpp).
+    static int Backup(DAConnectionSource& source, DABasePath& from, DABasePath& to);
+    static int Restore(DAConnectionSource& source, DABasePath& from, DABasePath& to);
+    static int CheckIntegrity(DAConnectionSource& source, DABasePath& location, bool full,
+                              std::vector<std::string>& problems);
+    static int RebuildIndexes(DAConnectionSource& source, DABasePath& location);
+    static int Salvage(DAConnectionSource& source, DABasePath& from, DABasePath& to, DASalvageReport& report);
 };
 
 #endif  // DAOPERATION_H

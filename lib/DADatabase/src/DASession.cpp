@@ -12,6 +12,7 @@
 #include <sqlite3.h>
 
 #include "DABusyRetry.h"
+#include "DAFiles.h"
 #include "DALocationRule.h"
 #include "DALog.h"
 #include "DAOperation.h"
@@ -48,6 +49,7 @@ struct DASessionState {
     bool sync = true;
     bool create = true;
     std::int64_t sizeLimit = 0;
+    int fileMode = -1;  // -1: DACreateDatabaseFile's default
 
     DABasePath location;
     std::string path;
@@ -385,6 +387,12 @@ void DASession::SetSizeLimit(std::int64_t bytes)
     m_state->sizeLimit = bytes;
 }
 
+void DASession::SetFileMode(int mode)
+{
+    const std::unique_lock<std::shared_mutex> life(m_state->life);
+    m_state->fileMode = mode;
+}
+
 int DASession::Open(DABasePath& location)
 {
     const char* const func = "Open";
@@ -401,6 +409,9 @@ int DASession::Open(DABasePath& location)
 
     DASessionSource source(state, __LINE__);
     DAConnection writer;
+    if (state.create) {
+        DACreateDatabaseFile(state.path, state.fileMode);
+    }
     int rc = source.OpenConnection(state.path, state.create ? kWriterFlags : kWriterFlags & ~SQLITE_OPEN_CREATE, func,
                                    writer);
     if (rc != SQLITE_OK) {
@@ -636,4 +647,36 @@ int DASession::Unwatch(char const* table)
     DASessionCall source(*m_state, __LINE__);
     DABasePath here;
     return DAOperations::Unwatch(source, here, table);
+}
+
+int DASession::Backup(DABasePath& to)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    return DAOperations::Backup(source, here, to);
+}
+
+int DASession::Restore(DABasePath& from)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    const int rc = DAOperations::Restore(source, from, here);
+    ++m_state->generation;  // a new schema, as no authorizer sees
+    return rc;
+}
+
+int DASession::CheckIntegrity(bool full, std::vector<std::string>& problems)
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    return DAOperations::CheckIntegrity(source, here, full, problems);
+}
+
+int DASession::RebuildIndexes()
+{
+    DASessionCall source(*m_state, __LINE__);
+    DABasePath here;
+    const int rc = DAOperations::RebuildIndexes(source, here);
+    ++m_state->generation;
+    return rc;
 }

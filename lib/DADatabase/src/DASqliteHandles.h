@@ -18,8 +18,14 @@ struct DASqliteFree {
     void operator()(char* text) const { sqlite3_free(text); }
 };
 
+// An online backup, finished (its error then on the destination).
+struct DABackupFinisher {
+    void operator()(sqlite3_backup* backup) const { sqlite3_backup_finish(backup); }
+};
+
 using DAConnection = std::unique_ptr<sqlite3, DAConnectionCloser>;
 using DAStatement = std::unique_ptr<sqlite3_stmt, DAStatementFinalizer>;
 using DAErrorText = std::unique_ptr<char, DASqliteFree>;
+using DABackup = std::unique_ptr<sqlite3_backup, DABackupFinisher>;
 
 #endif  // DASQLITEHANDLES_H
