@@ -163,7 +163,7 @@ int RunCursorQuery(DAConnectionSource& source, Request& request,
 }
 
 // The typed reads' rows: Query's into a whole store, QueryEach's one at a
-// time into a store whose buffers every row reuses.
+// time, viewed in the statement (no copy of its texts and blobs).
 struct EachRow {
     DATypedStore& store;
     const std::function<bool(DARow const&)>& visit;
@@ -177,9 +177,7 @@ int AppendRow(void* store, sqlite3_stmt* stmt)
 int VisitRow(void* user, sqlite3_stmt* stmt)
 {
     auto& each = *static_cast<EachRow*>(user);
-    each.store.Clear(true);
-    const int rc = each.store.Append(stmt);
-    each.store.position = 0;
+    const int rc = each.store.View(stmt);
     return rc != SQLITE_ROW ? rc : each.visit(each.store.row) ? SQLITE_ROW : SQLITE_DONE;
 }
 
@@ -462,6 +460,7 @@ int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DAT
             if (rc != kDAStaleStatement && store.rows == 0) {
                 store.TakeNames(stmt);
             }
+            store.Fit();
             return rc;
         });
 }
