@@ -58,6 +58,31 @@ bool IsNullValue(const char* c, const std::string& shape)
     return before != std::string::npos && std::strchr("(,=", shape[before]) != nullptr;
 }
 
+// The bytes at which a literal, or a text that runs as written, may begin;
+// any other byte is copied into the shape as it is.
+bool MayStartSomething(char c)
+{
+    switch (c) {
+    case '\0':
+    case 'X':
+    case 'N':
+    case '\'':
+    case '-':
+    case '/':
+    case ';':
+    case '"':
+    case '`':
+    case '[':
+    case '?':
+    case ':':
+    case '@':
+    case '$':
+        return true;
+    default:
+        return c >= '0' && c <= '9';
+    }
+}
+
 }  // namespace
 
 bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>& values)
@@ -66,6 +91,7 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
         return false;
     }
     shape.clear();
+    shape.reserve(std::strlen(sql));
     values.clear();
     for (const char* c = sql; *c != '\0';) {
         const bool glued = c != sql && (IsNameByte(static_cast<unsigned char>(c[-1])) || c[-1] == '.');
@@ -84,13 +110,16 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
                 return false;
             }
             for (++c;; ++c) {
-                if (*c == '\0') {
+                const char* quote = std::strchr(c, '\'');
+                if (quote == nullptr) {
                     return false;  // unterminated: SQLite says so
                 }
-                if (*c == '\'' && *++c != '\'') {
+                literal.text.append(c, quote);
+                c = quote + 1;
+                if (*c != '\'') {
                     break;
                 }
-                literal.text += *c;
+                literal.text += '\'';  // a doubled quote
             }
         } else if (*c >= '0' && *c <= '9' && !glued) {
             // The whole number: digits, a fraction, an exponent.
@@ -116,7 +145,14 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
                    (c[0] == '/' && c[1] == '*')) {
             return false;
         } else {
-            shape += *c++;
+            // This byte starts nothing here, and neither do those after it
+            // up to the next that may.
+            const char* end = c + 1;
+            while (!MayStartSomething(*end)) {
+                ++end;
+            }
+            shape.append(c, end);
+            c = end;
             continue;
         }
         if (IsNameByte(static_cast<unsigned char>(*c)) || values.size() == kMaxLiterals) {
