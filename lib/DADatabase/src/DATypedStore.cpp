@@ -88,6 +88,10 @@ int DATypedStore::Append(sqlite3_stmt* stmt)
         TakeNames(stmt);
     }
     const auto count = static_cast<int>(names.size());
+    if (rows == 0) {  // a one-row result (a read by key) grows its vectors once
+        types.reserve(names.size());
+        values.reserve(names.size());
+    }
     for (int i = 0; i < count; ++i) {
         DAValueType stored = DAValueType::Null;
         std::uint64_t value = 0;
