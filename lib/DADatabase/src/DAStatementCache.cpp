@@ -1,5 +1,6 @@
 #include "DAStatementCache.h"
 
+#include <array>
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
@@ -24,9 +25,21 @@ bool StartsWithDml(const char* sql)
     return false;
 }
 
+constexpr int kByteValues = 256;
+
+// The value of each upper-case hex digit by byte, -1 for any other byte:
+// a 1 MiB blob is 2 M digits.
+constexpr std::array<signed char, kByteValues> kHexDigits = [] {
+    std::array<signed char, kByteValues> digits{};
+    for (int c = 0; c < kByteValues; ++c) {
+        digits[c] = static_cast<signed char>(c >= '0' && c <= '9' ? c - '0' : c >= 'A' && c <= 'F' ? c - 'A' + 10 : -1);
+    }
+    return digits;
+}();
+
 int HexDigit(char c)
 {
-    return c >= '0' && c <= '9' ? c - '0' : c >= 'A' && c <= 'F' ? c - 'A' + 10 : -1;
+    return kHexDigits[static_cast<unsigned char>(c)];
 }
 
 // Reads the blob literal X'..' at c into bytes; returns its end, or null
@@ -162,6 +175,31 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
         shape += '?';
     }
     return true;
+}
+
+int DABindLiterals(sqlite3_stmt* stmt, const std::vector<DALiteral>& values)
+{
+    int rc = SQLITE_OK;
+    for (std::size_t i = 0; rc == SQLITE_OK && i < values.size(); ++i) {
+        const DALiteral& value = values[i];
+        const int index = static_cast<int>(i + 1);
+        const auto size = static_cast<sqlite3_uint64>(value.text.size());
+        switch (value.kind) {
+        case DALiteral::Kind::Integer:
+            rc = sqlite3_bind_int64(stmt, index, std::strtoll(value.text.c_str(), nullptr, 10));
+            break;
+        case DALiteral::Kind::Null:
+            rc = sqlite3_bind_null(stmt, index);
+            break;
+        case DALiteral::Kind::Blob:
+            rc = sqlite3_bind_blob64(stmt, index, value.text.data(), size, SQLITE_STATIC);
+            break;
+        case DALiteral::Kind::Text:
+            rc = sqlite3_bind_text64(stmt, index, value.text.data(), size, SQLITE_STATIC, SQLITE_UTF8);
+            break;
+        }
+    }
+    return rc;
 }
 
 sqlite3_stmt* DAStatementCache::Take(const std::string& shape)

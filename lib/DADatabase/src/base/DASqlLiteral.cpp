@@ -2,6 +2,13 @@
 
 #include <array>
 #include <charconv>
+#include <cstring>
+
+namespace {
+
+constexpr unsigned kByteValues = 256;
+
+}  // namespace
 
 void DAAppendTextLiteral(std::string& sql, const std::string& value)
 {
@@ -18,15 +25,23 @@ void DAAppendTextLiteral(std::string& sql, const std::string& value)
 
 void DAAppendBlobLiteral(std::string& sql, const unsigned char* bytes, std::size_t size)
 {
-    static const char kHex[] = "0123456789ABCDEF";
+    // Both digits of each byte at once: a 1 MiB blob is 2 M digits.
+    static const std::array<char, 2 * kByteValues> kPairs = [] {
+        const char* const hex = "0123456789ABCDEF";
+        std::array<char, 2 * kByteValues> pairs{};
+        for (unsigned byte = 0; byte < kByteValues; ++byte) {
+            pairs[2 * byte] = hex[byte >> 4U];
+            pairs[2 * byte + 1] = hex[byte & 0xFU];
+        }
+        return pairs;
+    }();
     const std::size_t start = sql.size();
     sql.resize(start + 2 * size + 3);
     char* out = &sql[start];
     *out++ = 'X';
     *out++ = '\'';
-    for (std::size_t i = 0; i < size; ++i) {
-        *out++ = kHex[bytes[i] >> 4U];
-        *out++ = kHex[bytes[i] & 0xFU];
+    for (std::size_t i = 0; i < size; ++i, out += 2) {
+        std::memcpy(out, &kPairs[2 * static_cast<std::size_t>(bytes[i])], 2);
     }
     *out = '\'';
 }
