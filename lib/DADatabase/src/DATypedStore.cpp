@@ -4,28 +4,46 @@
 
 namespace {
 
-// The value of column i of stmt's row: its type, its 8 bytes, and for a
-// text or blob its bytes and size. False when SQLite could not give them.
+// Holds the connection's mutex over the reads of a row: each sqlite3_column_
+// call would take it again, and a column's value read under it is
+// protected (sqlite3_value_ reads are allowed on it).
+class RowLock {
+public:
+    explicit RowLock(sqlite3_stmt* stmt) : m_mutex(sqlite3_db_mutex(sqlite3_db_handle(stmt)))
+    {
+        sqlite3_mutex_enter(m_mutex);
+    }
+    ~RowLock() { sqlite3_mutex_leave(m_mutex); }
+    RowLock(const RowLock&) = delete;
+    RowLock& operator=(const RowLock&) = delete;
+
+private:
+    sqlite3_mutex* m_mutex;  // null for a connection without one: a no-op
+};
+
+// The value of column i of stmt's row (read under a RowLock): its type,
+// its 8 bytes, and for a text or blob its bytes and size. False when
+// SQLite could not give them.
 bool ReadValue(sqlite3_stmt* stmt, int i, DAValueType& stored, std::uint64_t& value, const unsigned char*& bytes,
                std::uint32_t& size)
 {
-    const int type = sqlite3_column_type(stmt, i);
+    sqlite3_value* column = sqlite3_column_value(stmt, i);
+    const int type = sqlite3_value_type(column);
     value = 0;
     stored = DAValueType::Null;
     if (type == SQLITE_INTEGER) {
         stored = DAValueType::Integer;
-        value = static_cast<std::uint64_t>(sqlite3_column_int64(stmt, i));
+        value = static_cast<std::uint64_t>(sqlite3_value_int64(column));
     } else if (type == SQLITE_FLOAT) {
         stored = DAValueType::Real;
-        const double real = sqlite3_column_double(stmt, i);
+        const double real = sqlite3_value_double(column);
         std::memcpy(&value, &real, sizeof value);
     } else if (type == SQLITE_TEXT || type == SQLITE_BLOB) {
         stored = type == SQLITE_TEXT ? DAValueType::Text : DAValueType::Blob;
         // The pointer first, then the size: the order SQLite asks for.
-        bytes = static_cast<const unsigned char*>(type == SQLITE_TEXT
-                                                      ? static_cast<const void*>(sqlite3_column_text(stmt, i))
-                                                      : sqlite3_column_blob(stmt, i));
-        size = static_cast<std::uint32_t>(sqlite3_column_bytes(stmt, i));
+        bytes = static_cast<const unsigned char*>(
+            type == SQLITE_TEXT ? static_cast<const void*>(sqlite3_value_text(column)) : sqlite3_value_blob(column));
+        size = static_cast<std::uint32_t>(sqlite3_value_bytes(column));
         // An empty blob has no pointer; anything else is out of memory.
         return bytes != nullptr || (size == 0 && type == SQLITE_BLOB);
     }
@@ -92,6 +110,7 @@ int DATypedStore::Append(sqlite3_stmt* stmt)
         types.reserve(names.size());
         values.reserve(names.size());
     }
+    const RowLock lock(stmt);
     for (int i = 0; i < count; ++i) {
         DAValueType stored = DAValueType::Null;
         std::uint64_t value = 0;
@@ -127,6 +146,7 @@ int DATypedStore::View(sqlite3_stmt* stmt)
     live = true;
     rows = 1;
     position = 0;
+    const RowLock lock(stmt);
     for (std::size_t i = 0; i < count; ++i) {
         DAValueType stored = DAValueType::Null;
         std::uint32_t size = 0;
