@@ -46,16 +46,15 @@ int HexDigit(char c)
 // when it is not one (odd or lower-case digits: the text runs as written).
 const char* ReadBlob(const char* c, std::string& bytes)
 {
-    const char* end = c + 2;
-    while (HexDigit(*end) >= 0) {
-        ++end;
-    }
-    if (*end != '\'' || (end - c) % 2 != 0) {
+    const char* digits = c + 2;
+    const std::size_t count = std::strspn(digits, "0123456789ABCDEF");
+    const char* end = digits + count;
+    if (*end != '\'' || count % 2 != 0) {
         return nullptr;
     }
-    bytes.resize(static_cast<std::size_t>(end - c - 2) / 2);
+    bytes.resize(count / 2);
     for (std::size_t i = 0; i < bytes.size(); ++i) {
-        bytes[i] = static_cast<char>(HexDigit(c[2 + 2 * i]) * 16 + HexDigit(c[3 + 2 * i]));
+        bytes[i] = static_cast<char>(HexDigit(digits[2 * i]) * 16 + HexDigit(digits[2 * i + 1]));
     }
     return end + 1;
 }
