@@ -25,17 +25,21 @@ bool StartsWithDml(const char* sql)
     return false;
 }
 
-constexpr int kByteValues = 256;
+constexpr std::size_t kByteValues = 256;
 
 // The value of each upper-case hex digit by byte, -1 for any other byte:
-// a 1 MiB blob is 2 M digits.
-constexpr std::array<signed char, kByteValues> kHexDigits = [] {
+// a 1 MiB blob is 2 M digits, each read through this table.
+std::array<signed char, kByteValues> HexDigits()
+{
     std::array<signed char, kByteValues> digits{};
-    for (int c = 0; c < kByteValues; ++c) {
-        digits[c] = static_cast<signed char>(c >= '0' && c <= '9' ? c - '0' : c >= 'A' && c <= 'F' ? c - 'A' + 10 : -1);
+    for (std::size_t i = 0; i < kByteValues; ++i) {
+        const int b = static_cast<int>(i);
+        digits[i] = static_cast<signed char>(b >= '0' && b <= '9' ? b - '0' : b >= 'A' && b <= 'F' ? b - 'A' + 10 : -1);
     }
     return digits;
-}();
+}
+
+const std::array<signed char, kByteValues> kHexDigits = HexDigits();
 
 int HexDigit(char c)
 {

@@ -6,7 +6,7 @@
 
 namespace {
 
-constexpr unsigned kByteValues = 256;
+constexpr std::size_t kByteValues = 256;
 
 }  // namespace
 
@@ -29,7 +29,7 @@ void DAAppendBlobLiteral(std::string& sql, const unsigned char* bytes, std::size
     static const std::array<char, 2 * kByteValues> kPairs = [] {
         const char* const hex = "0123456789ABCDEF";
         std::array<char, 2 * kByteValues> pairs{};
-        for (unsigned byte = 0; byte < kByteValues; ++byte) {
+        for (std::size_t byte = 0; byte < kByteValues; ++byte) {
             pairs[2 * byte] = hex[byte >> 4U];
             pairs[2 * byte + 1] = hex[byte & 0xFU];
         }
