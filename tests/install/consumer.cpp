@@ -10,8 +10,6 @@
 #include <DAColumnName.h>
 #include <DACreateRequest.h>
 #include <DACursor.h>
-#include <DARow.h>
-#include <DATypedCursor.h>
 #include <DADatabase.h>
 #include <DADatabaseParser.h>
 #include <DADeleteRequest.h>
@@ -21,9 +19,11 @@
 #include <DALogger.h>
 #include <DAMutex.h>
 #include <DAQueryRequest.h>
+#include <DARow.h>
 #include <DASelectRequest.h>
 #include <DASession.h>
 #include <DASqlGenerator.h>
+#include <DATypedCursor.h>
 #include <DAUpdateRequest.h>
 #include <DAUpsertRequest.h>
 #include <dlog.h>

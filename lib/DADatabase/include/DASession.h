@@ -229,6 +229,7 @@ public:
     /// there.
     int Unwatch(char const* table);
 
+    ///@{
     /// DADatabase's Backup, Restore, CheckIntegrity and RebuildIndexes at
     /// the session's file: codes, lines and files as stated in DADatabase.h.
     /// Backup and CheckIntegrity read on a reader connection (with the log,

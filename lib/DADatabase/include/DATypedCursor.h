@@ -21,8 +21,11 @@ public:
     virtual ~DATypedCursor();
     DATypedCursor(const DATypedCursor&) = delete;
     DATypedCursor& operator=(const DATypedCursor&) = delete;
+    ///@{
+    /// Takes other's rows and position; other keeps no rows (count 0).
     DATypedCursor(DATypedCursor&& other) noexcept;
     DATypedCursor& operator=(DATypedCursor&& other) noexcept;
+    ///@}
 
     /// The rows; 0 for an empty result (not -1).
     int GetCount() const;

@@ -38,7 +38,9 @@ struct DAIsOtherInteger
 /// nothing but std::bad_alloc.
 class DAValue {
 public:
-    // Implicit by design: a list of values reads as {ts, id}.
+    ///@{
+    /// The value given, written at once (see above). Implicit by design: a
+    /// list of values reads as {ts, id}.
     // NOLINTBEGIN(google-explicit-constructor, hicpp-explicit-conversions)
     DAValue(std::int64_t value);
     DAValue(int value) : DAValue(static_cast<std::int64_t>(value)) {}
@@ -55,6 +57,7 @@ public:
     DAValue(char const* text);
     DAValue(std::string const& text);
     // NOLINTEND(google-explicit-constructor, hicpp-explicit-conversions)
+    ///@}
 
     /// NULL.
     static DAValue Null();

@@ -17,8 +17,11 @@
 
 struct DATypedStore {
     DATypedStore() = default;
+    ~DATypedStore() = default;
     DATypedStore(const DATypedStore&) = delete;
     DATypedStore& operator=(const DATypedStore&) = delete;
+    DATypedStore(DATypedStore&&) = default;
+    DATypedStore& operator=(DATypedStore&&) = default;
 
     // Forgets the rows, keeping the buffers' capacity; the names too unless
     // keepNames.
