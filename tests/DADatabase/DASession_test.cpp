@@ -81,7 +81,7 @@ TEST_P(SessionOperation, MatchesDatabase)
     const int expected = GetParam().run(viaDb, perCall, expectedRows);
     Strings expectedLines = Described(log);
     if (GetParam().expected != nullptr) {
-        EXPECT_EQ(GetParam().expected, Summary(expected, expectedRows, perCall));
+        EXPECT_EQ(GetParam().expected, Summary(expected, expectedRows, perCall, expectedLines));
     }
     for (std::string& line : expectedLines) {
         line = std::regex_replace(line, std::regex("DADatabase\\.cpp"), "DASession.cpp");

@@ -300,7 +300,8 @@ TEST_F(ConcurrentDatabase, SessionAndPerCallProcessesShareAFile)
 
 // Three upgrade steps (a table, an added column, an index), each also
 // inserting one marker row, run at start by 4 processes and 4 threads at
-// once: every call succeeds and each step runs exactly once.
+// once: every call succeeds, each step runs exactly once and exactly one
+// caller reports it applied.
 TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAcrossProcessesAndThreads)
 {
     const std::string dir = Dir();
@@ -316,7 +317,7 @@ TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAcrossProcessesAndThreads)
         index.SetTable("markers");
         index.SetName("markers_step");
         index.AddColumn("step");
-        int failures = 0;
+        int failures = 0;  // and the steps this caller applied, in bits 1..3
         for (int version = 1; version <= 3; ++version) {
             DABatchRequest step;
             step.SetPath(dir.c_str(), "t.db");
@@ -327,7 +328,8 @@ TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAcrossProcessesAndThreads)
                 k > 0 ? row.SetData("_ID", 100 + k) : row.SetData("step", version);
                 step.Add(row);
             }
-            failures += database.Migrate(step, version) != 0 ? 1 : 0;
+            bool applied = false;
+            failures += database.Migrate(step, version, applied) != 0 ? 16 : applied ? 1 << version : 0;
         }
         return failures;
     };
@@ -346,17 +348,26 @@ TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAcrossProcessesAndThreads)
     }
     close(go[0]);
     const LogCapture log;
+    std::atomic<int> applied{0};  // each bit's count, in its own 4 bits
+    const auto count = [&applied](int bits) {
+        EXPECT_EQ(0, bits & ~0xE);
+        for (int version = 1; version <= 3; ++version) {
+            applied += ((bits >> version) & 1) << (4 * version);
+        }
+    };
     RunTogether([&](int t) {
         if (t == 0) {
             close(go[1]);
         }
-        EXPECT_EQ(0, upgrade());
+        count(upgrade());
     });
     for (const pid_t child : children) {
         int status = -1;
         EXPECT_EQ(child, waitpid(child, &status, 0));
-        EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << status;
+        EXPECT_TRUE(WIFEXITED(status)) << status;
+        count(WEXITSTATUS(status));
     }
+    EXPECT_EQ(0x1110, applied.load());
     EXPECT_EQ("3;1|1;2|1;3|1",
               RawDb(PathOf("t.db")).Query("PRAGMA user_version") + ";" +
                   RawDb(PathOf("t.db")).Query("SELECT step, count(*) FROM markers WHERE step > 0 GROUP BY step"));

@@ -71,20 +71,34 @@ inline const Operation kOperations[] = {
          DACreateRequest create;
          DADropRequest drop;
          At(create, dir, "notes").SetColumnKey("text", "TEXT");
-         return RUN(t, CreateTable, create) * 10 + RUN(t, DropTable, At(drop, dir, "gone"));
-     }},
+         const int rc = RUN(t, CreateTable, create) * 10 + RUN(t, DropTable, At(drop, dir, "gone"));
+         return rc * 10 + RUN(t, CreateTable, At(create, dir, "contacts_by_name"));  // an index's name
+     },
+     0,
+     "11 / / ok|0/contacts;contacts_by_name;groups;notes/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "4 DADatabase.cpp:CreateTable > createTable SUCCESS[0]\n"
+     "6 DADatabase.cpp:DropTable > DropTable FAILED[1]: no such table: gone\n"
+     "6 DADatabase.cpp:CreateTable > createTable FAILED[1]: there is already an index named contacts_by_name"},
     {"drop_table",
      [](Target& t, const std::string& dir, DACursor&) {
          DADropRequest drop;
          return RUN(t, DropTable, At(drop, dir, "groups"));
-     }},
+     },
+     0,
+     "0 / / ok|0/contacts;contacts_by_name/1|Kim|010;2|Lee|011;3|Park|012/\n"
+     "4 DADatabase.cpp:DropTable > DropTable SUCCESS[0]"},
     {"upsert",
      [](Target& t, const std::string& dir, DACursor&) {
          DAUpsertRequest upsert;
          At(upsert, dir, "contacts").SetData("_ID", 1);
          upsert.SetData("name", "Cho");
-         return RUN(t, Upsert, upsert);
-     }},
+         const int rc = RUN(t, Upsert, upsert);
+         return rc * 10 + RUN(t, Upsert, At(upsert, dir, "people"));
+     },
+     0,
+     "1 / / ok|0/contacts;contacts_by_name;groups/1|Cho|NULL;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "4 DADatabase.cpp:Upsert > Upsert SUCCESS[0]\n"
+     "6 DADatabase.cpp:Upsert > Upsert FAILED[1]: no such table: people"},
     {"update",  // the second changes what the first did again
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAUpdateRequest update;
@@ -92,8 +106,13 @@ inline const Operation kOperations[] = {
          int changes = -1;
          const int rc = RUN(t, Update, update) * 10 + RUN(t, Update, update, changes);
          Note(cursor, std::to_string(changes));
-         return rc;
-     }},
+         return rc * 10 + RUN(t, Update, Make(update, dir, "people"), changes);  // leaves changes alone
+     },
+     0,
+     "1 / noted 1 / ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Han|012/1|Family;2|Work\n"
+     "4 DADatabase.cpp:Update > update SUCCESS[0]\n"
+     "4 DADatabase.cpp:Update > update SUCCESS[0]\n"
+     "6 DADatabase.cpp:Update > update FAILED[1]: no such table: people"},
     {"delete",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DADeleteRequest remove;
@@ -102,7 +121,12 @@ inline const Operation kOperations[] = {
              RUN(t, Delete, Make(remove, dir, "people"));
          Note(cursor, std::to_string(changes));
          return rc;
-     }},
+     },
+     0,
+     "1 / noted 0 / ok|0/contacts;contacts_by_name;groups/1|Kim|010;3|Park|012/1|Family;2|Work\n"
+     "4 DADatabase.cpp:Delete > delete SUCCESS[0]\n"
+     "4 DADatabase.cpp:Delete > delete SUCCESS[0]\n"
+     "6 DADatabase.cpp:Delete > delete FAILED[1]: no such table: people"},
     {"insert",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAInsertRequest insert;
@@ -111,12 +135,19 @@ inline const Operation kOperations[] = {
          const int rc = RUN(t, Insert, insert, rowId);
          Note(cursor, std::to_string(rowId));
          return rc;
-     }},
+     },
+     0,
+     "0 / noted 4 / ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012;4|Yoo|NULL/1|Family;2|Work\n"
+     "4 DADatabase.cpp:Insert > Insert SUCCESS[0]"},
     {"select",  // the failing one leaves the cursor as it was
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DASelectRequest r;
          return RUN(t, Select, Make(r, dir, "contacts"), cursor) * 10 + RUN(t, Select, Make(r, dir, "people"), cursor);
-     }},
+     },
+     0,
+     "1 / _ID name phone 2 Lee 011 / "
+     "ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "6 DADatabase.cpp:Select > SELECT FAILED[1]: no such table: people"},
     {"same_shapes_other_values",  // a session binds these into the statement it kept
      [](Target& t, const std::string& dir, DACursor& cursor) {
          std::string seen;
@@ -142,23 +173,42 @@ inline const Operation kOperations[] = {
          }
          Note(cursor, seen);
          return rc;
-     }},
+     },
+     0,
+     "0 / noted 1 -1 1 9 12 3  / "
+     "ok|0/contacts;contacts_by_name;groups/"
+     "1|Kim|010;2|Lee|011;3|Park|012;10|NULL|NULL;11|NULL|NULL;12|NULL|NULL;13|NULL|NULL;14|NULL|NULL;15|NULL|NULL;16|"
+     "NULL|NULL;17|NULL|NULL;18|NULL|NULL;19|NULL|NULL;20|NULL|NULL;21|NULL|NULL/1|Family;2|Work\n"
+     "4 DADatabase.cpp:ExecuteBatch > ExecuteBatch SUCCESS[0]: 12 statements"},
     {"join_select",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAJoinRequest r;
          At(r, dir).SetLeftJoin("contacts", "_ID");
          r.SetRightJoin("groups", "_ID");
-         return RUN(t, JoinSelect, r, cursor);
-     }},
+         const int rc = RUN(t, JoinSelect, r, cursor);
+         r.SetLeftJoin("people", "_ID");
+         return rc * 10 + RUN(t, JoinSelect, r, cursor);
+     },
+     0,
+     "1 / _ID name phone _ID title 1 Kim 010 1 Family 1 Lee 011 1 Work / "
+     "ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "6 DADatabase.cpp:JoinSelect > JoinSelect FAILED[1]: no such table: people"},
     {"query_second_page",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAQueryRequest r;
          At(r, dir, "contacts").SetOrderBy("name", true);
+         r.SetLimit(2, 3);  // past the end: the cursor emptied
+         cursor.SetColumn("mine");
+         int rc = RUN(t, Query, r, cursor) * 10 + cursor.GetCount() + 1;
          r.SetLimit(2, 1);
-         const int rc = RUN(t, Query, r, cursor);
+         rc = rc * 10 + RUN(t, Query, r, cursor);
          r.SetOrderBy("age");
          return rc * 10 + RUN(t, Query, r, cursor);
-     }},
+     },
+     0,
+     "1 / _ID name phone 2 Lee 011 1 Kim 010 / "
+     "ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "6 DADatabase.cpp:Query > QUERY FAILED[1]: no such column: age"},
     {"check_exist_table",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          bool groups = false;
@@ -169,20 +219,33 @@ inline const Operation kOperations[] = {
              : t.db->CheckExistTable(At(at, dir), "groups", groups) * 10 + t.db->CheckExistTable(at, "people", people);
          Note(cursor, groups && !people ? "yes" : "no");
          return rc;
-     }},
-    {"create_index",
+     },
+     0, "0 / noted yes / ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work"},
+    {"create_index",  // again: nothing changes; on a missing table: fails
      [](Target& t, const std::string& dir, DACursor&) {
          DACreateIndexRequest index;
          At(index, dir, "contacts").SetName("by_phone");
-         index.AddColumn("phone");
-         return RUN(t, CreateIndex, index);
-     }},
+         index.AddColumn("phone", true);
+         index.AddColumn("name");
+         const int rc = RUN(t, CreateIndex, index) * 10 + RUN(t, CreateIndex, index);
+         return rc * 10 + RUN(t, CreateIndex, At(index, dir, "people"));
+     },
+     0,
+     "1 / / ok|0/by_phone;contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "4 DADatabase.cpp:CreateIndex > CreateIndex SUCCESS[0]\n"
+     "4 DADatabase.cpp:CreateIndex > CreateIndex SUCCESS[0]\n"
+     "6 DADatabase.cpp:CreateIndex > CreateIndex FAILED[1]: no such table: main.people"},
     {"add_column",  // the second fails: the column is there
      [](Target& t, const std::string& dir, DACursor&) {
          DAAddColumnRequest column;
-         At(column, dir, "contacts").SetColumn("email", "TEXT");
+         At(column, dir, "contacts").SetColumn("level", "INTEGER");
+         column.SetDefault("0");
          return RUN(t, AddColumn, column) * 10 + RUN(t, AddColumn, column);
-     }},
+     },
+     0,
+     "1 / / ok|0/contacts;contacts_by_name;groups/1|Kim|010|0;2|Lee|011|0;3|Park|012|0/1|Family;2|Work\n"
+     "4 DADatabase.cpp:AddColumn > AddColumn SUCCESS[0]\n"
+     "6 DADatabase.cpp:AddColumn > AddColumn FAILED[1]: duplicate column name: level"},
     {"migrate_and_compact",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DABatchRequest step;
@@ -192,14 +255,28 @@ inline const Operation kOperations[] = {
          At(at, dir);
          int version = -1;
          std::int64_t bytes[2] = {-1, -1};
-         int rc = RUN(t, Migrate, step, 1) * 10 + RUN(t, Migrate, step, 1);  // the second is skipped
+         DABatchRequest failing;  // its second request fails
+         DADropRequest drop;
+         At(failing, dir).Add(remove);
+         failing.Add(At(drop, dir, "gone"));
+         int rc = RUN(t, Migrate, step, 3) + RUN(t, Migrate, step, 0);  // too new, below 1: refused
+         rc = rc * 10 + RUN(t, Migrate, step, 1) * 10 + RUN(t, Migrate, step, 1);  // the second is skipped
+         rc = rc * 10 + RUN(t, Migrate, failing, 2);
          rc = rc * 10 +
              (t.session != nullptr
                   ? t.session->GetVersion(version) + t.session->Compact() + t.session->GetSpace(bytes[0], bytes[1])
                   : t.db->GetVersion(at, version) + t.db->Compact(at) + t.db->GetSpace(at, bytes[0], bytes[1]));
          Note(cursor, std::to_string(version) + " " + std::to_string(bytes[0]) + " " + std::to_string(bytes[1]));
          return rc;
-     }},
+     },
+     0,
+     "42010 / noted 1 16384 0 / ok|1/contacts;contacts_by_name;groups/1|Kim|010;3|Park|012/1|Family;2|Work\n"
+     "6 DADatabase.cpp:Migrate > Migrate FAILED[21]: file at version 0, step for version 3\n"
+     "6 DADatabase.cpp:Migrate > Migrate FAILED[21]: step for version 0, versions start at 1\n"
+     "4 DADatabase.cpp:Migrate > Migrate SUCCESS[0]: version 1\n"
+     "4 DADatabase.cpp:Migrate > Migrate SKIPPED: file at version 1\n"
+     "6 DADatabase.cpp:Migrate > Migrate FAILED[1] at 2/2: no such table: gone\n"
+     "4 DADatabase.cpp:Compact > Compact SUCCESS[0]"},
     {"search_index_by_migration_then_dropped",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DASearchIndexRequest index;
@@ -218,7 +295,16 @@ inline const Operation kOperations[] = {
              (t.session != nullptr ? t.session->DropSearchIndex("names") : t.db->DropSearchIndex(At(at, dir), "names"));
          return rc * 10 + RUN(t, Search, search, cursor) + RUN(t, CreateSearchIndex, index);
      },
-     kSteps | kHeavy},
+     kSteps | kHeavy,
+     "1 / _ID name phone hit 2 Lee 011 <Lee> / "
+     "ok|1/"
+     "contacts;contacts_by_name;groups;ulo_search_names;ulo_search_names_config;ulo_search_names_content;ulo_search_"
+     "names_data;ulo_search_names_delete;ulo_search_names_docsize;ulo_search_names_idx;ulo_search_names_insert;ulo_"
+     "search_names_update/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "4 DADatabase.cpp:Migrate > Migrate SUCCESS[0]: version 1\n"
+     "4 DADatabase.cpp:DropSearchIndex > DropSearchIndex SUCCESS[0]\n"
+     "6 DADatabase.cpp:Search > SEARCH FAILED[1]: no such table: ulo_search_names\n"
+     "4 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex SUCCESS[0]"},
     {"keeping_rows_counters_row_ids_applied_steps",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAUpsertRequest keep;  // updates row 1 in place: its phone stays
@@ -254,8 +340,15 @@ inline const Operation kOperations[] = {
          return rc;
      },
      kSteps,
-     "0 / noted 10 24 -1 33 / ok|1/contacts;contacts_by_name;groups/1|Cho|010;2|Min|NULL;3|Park|012/"
-     "1|Family;13|Club;23|Club;24|Club;32|Work;33|Club"},
+     "0 / noted 10 24 -1 33 / "
+     "ok|1/contacts;contacts_by_name;groups/1|Cho|010;2|Min|NULL;3|Park|012/"
+     "1|Family;13|Club;23|Club;24|Club;32|Work;33|Club\n"
+     "4 DADatabase.cpp:Upsert > Upsert SUCCESS[0]\n"
+     "4 DADatabase.cpp:Upsert > Upsert SUCCESS[0]\n"
+     "4 DADatabase.cpp:Update > update SUCCESS[0]\n"
+     "4 DADatabase.cpp:Migrate > Migrate SUCCESS[0]: version 1\n"
+     "4 DADatabase.cpp:Migrate > Migrate SKIPPED: file at version 1\n"
+     "4 DADatabase.cpp:ExecuteBatch > ExecuteBatch SUCCESS[0]: 4 statements"},
     {"unwatch",  // removes the triggers and counters a watch installed; refuses a name that is not plain
      [](Target& t, const std::string& dir, DACursor&) {
          DAWatch watch;
@@ -266,7 +359,11 @@ inline const Operation kOperations[] = {
              (t.session != nullptr ? t.session->Unwatch("contacts") * 10 + t.session->Unwatch("a b")
                                    : t.db->Unwatch(at, "contacts") * 10 + t.db->Unwatch(at, "a b"));
      },
-     kSteps | kHeavy},
+     kSteps | kHeavy,
+     "21 / / ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "4 DAWatch.cpp:AddTable > AddTable SUCCESS[0]\n"
+     "4 DADatabase.cpp:Unwatch > Unwatch SUCCESS[0]\n"
+     "6 DADatabase.cpp:Unwatch > Unwatch FAILED[21]: table name is not a plain name"},
     {"backup_check_rebuild_restore",  // the restored rows read at once, on every connection
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DABasePath at;
@@ -287,7 +384,16 @@ inline const Operation kOperations[] = {
          rc = rc * 10 + (s != nullptr ? s->Backup(copy) : t.db->Backup(at, copy));  // the restore left no log
          return rc * 10 + RUN(t, Select, Make(select, dir, "contacts"), cursor) + static_cast<int>(problems.size());
      },
-     kSteps | kHeavy},
+     kSteps | kHeavy,
+     "2100 / _ID name phone 2 Lee 011 / "
+     "ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "4 DADatabase.cpp:Backup > Backup SUCCESS[0]: 4 pages\n"
+     "4 DADatabase.cpp:Delete > delete SUCCESS[0]\n"
+     "4 DADatabase.cpp:CheckIntegrity > CheckIntegrity SUCCESS[0]: 0 problems\n"
+     "4 DADatabase.cpp:RebuildIndexes > RebuildIndexes SUCCESS[0]: 0 recreated\n"
+     "4 DADatabase.cpp:Restore > Restore SUCCESS[0]: 4 pages\n"
+     "6 DADatabase.cpp:Backup > Backup FAILED[21]: the copy would replace its own source DIR/t.db\n"
+     "4 DADatabase.cpp:Backup > Backup SUCCESS[0]: 4 pages"},
     {"batch",  // the second rolls back
      [](Target& t, const std::string& dir, DACursor&) {
          DABatchRequest batch;
@@ -300,7 +406,11 @@ inline const Operation kOperations[] = {
          const int rc = RUN(t, ExecuteBatch, batch) * 100 + batch.GetChanges();
          batch.Add(At(drop, dir, "gone"));
          return rc * 10 + RUN(t, ExecuteBatch, batch);
-     }},
+     },
+     0,
+     "21 / / ok|0/contacts;contacts_by_name;groups/1|Kim|010;3|Park|012/1|Family;2|Work;3|Club\n"
+     "4 DADatabase.cpp:ExecuteBatch > ExecuteBatch SUCCESS[0]: 2 statements\n"
+     "6 DADatabase.cpp:ExecuteBatch > ExecuteBatch FAILED[1] at 3/3: no such table: gone"},
 };
 
 // dir (made if missing) with the seeded t.db.
@@ -350,14 +460,22 @@ inline Strings Cells(DACursor& cursor)
     return out;
 }
 
-// What a row gave, as one text: its code, the cells it read, the file.
-inline std::string Summary(int rc, DACursor& cursor, const std::string& dir)
+// What a row gave, as one text: its code, the cells it read, the file, its
+// lines.
+inline std::string Summary(int rc, DACursor& cursor, const std::string& dir, Strings lines)
 {
     std::string out = std::to_string(rc) + " /";
     for (const std::string& cell : Cells(cursor)) {
         out += " " + cell;
     }
-    return out + " / " + Content(dir);
+    out += " / " + Content(dir);
+    for (std::string& line : lines) {
+        for (std::size_t at = line.find(dir); at != std::string::npos; at = line.find(dir)) {
+            line.replace(at, dir.size(), "DIR");
+        }
+        out += "\n" + line;
+    }
+    return out;
 }
 
 #endif  // ULO_TESTS_OPERATIONS_H
