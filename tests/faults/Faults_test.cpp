@@ -678,11 +678,13 @@ TEST_F(Faults, RandomTextsRoundTripAsValuesAndConditions)
     }
 }
 
+// Random moves and reads of cursors of -1 (no column) to 4 rows against a
+// model of them: each code, position and failure line.
 TEST(CursorModel, RandomMovesAgreeWithIt)
 {
     std::mt19937 random(2);
     const LogCapture log;
-    std::size_t failures = 0;
+    Strings expected;  // the line of each failure
     for (int round = 0; round < 100; ++round) {
         const auto draw = [&](int low, int high) { return std::uniform_int_distribution<int>(low, high)(random); };
         const int count = draw(-1, 4);  // -1: no column
@@ -701,19 +703,35 @@ TEST(CursorModel, RandomMovesAgreeWithIt)
              [&] { return row >= 0 && row < count ? (position = row, 0) : 1; }},
             {[&] { return cursor.MoveToFirst(), 0; }, [&] { return position = -1, 0; }},
             {[&] { return cursor.MoveToLast(), 0; }, [&] { return position = count, 0; }},
-            {[&] { return cursor.GetString("b", value = "-"); },
-             [&] { return position >= 0 && position < count && value == std::to_string(position) ? 0 : 1; }},
+            {[&] { return cursor.GetString("b", value = "-"); },  // a failed read leaves the output alone
+             [&] {
+                 return position >= 0 && position < count ? (value == std::to_string(position) ? 0 : 9)
+                                                          : (value == "-" ? 1 : 9);
+             }},
         };
+        const std::string lines[] = {"4 DACursor.cpp:MoveToNext > Last Row",
+                                     "4 DACursor.cpp:MoveToPrev > First Row",
+                                     "6 DACursor.cpp:MoveToPosition > Invalid Position",
+                                     "",
+                                     "",
+                                     count < 0 ? "6 DACursor.cpp:GetString > NO MATCHED ERROR!!!"
+                                               : "6 DACursor.cpp:GetString > CURSOR RANGE ERROR!!!"};
         for (int step = 0; step < 60; ++step) {
             const int move = draw(0, 5);
             row = draw(-2, 5);
             const int got = moves[move].first();
             ASSERT_EQ(moves[move].second(), got) << "round " << round << " step " << step << " move " << move;
             ASSERT_EQ(position, cursor.GetPosition()) << "round " << round << " step " << step;
-            failures += got != 0 ? 1 : 0;
+            if (got != 0) {
+                expected.push_back(lines[move]);
+            }
         }
+        cursor.Initialize();  // as if new
+        Strings names;
+        EXPECT_EQ((std::vector<int>{-1, -1, 1}),
+                  (std::vector<int>{cursor.GetCount(), cursor.GetPosition(), cursor.GetColumn(names)}));
     }
-    EXPECT_EQ(failures, log.Lines().size());
+    EXPECT_EQ(expected, Described(log));
 }
 
 }  // namespace
