@@ -394,23 +394,31 @@ inline const Operation kOperations[] = {
      "4 DADatabase.cpp:Restore > Restore SUCCESS[0]: 4 pages\n"
      "6 DADatabase.cpp:Backup > Backup FAILED[21]: the copy would replace its own source DIR/t.db\n"
      "4 DADatabase.cpp:Backup > Backup SUCCESS[0]: 4 pages"},
-    {"batch",  // the second rolls back
+    {"batch",  // the second rolls back; a create counts no change
      [](Target& t, const std::string& dir, DACursor&) {
          DABatchRequest batch;
+         DACreateRequest create;
          DAUpsertRequest upsert;
+         DAUpdateRequest update;
          DADeleteRequest remove;
          DADropRequest drop;
+         create.SetPath((dir + "/").c_str(), "t.db");  // the same file, written otherwise
+         create.SetTable("notes");
+         create.SetColumnKey("text", "TEXT");
          At(upsert, dir, "groups").SetData("title", "Club");
-         At(batch, dir).Add(upsert);
+         At(batch, dir).Add(create);
+         batch.Add(upsert);
+         Make(update, dir, "contacts", "name", "Kim").SetData("phone", "099");
+         batch.Add(update);
          batch.Add(Make(remove, dir, "contacts"));
          const int rc = RUN(t, ExecuteBatch, batch) * 100 + batch.GetChanges();
          batch.Add(At(drop, dir, "gone"));
          return rc * 10 + RUN(t, ExecuteBatch, batch);
      },
      0,
-     "21 / / ok|0/contacts;contacts_by_name;groups/1|Kim|010;3|Park|012/1|Family;2|Work;3|Club\n"
-     "4 DADatabase.cpp:ExecuteBatch > ExecuteBatch SUCCESS[0]: 2 statements\n"
-     "6 DADatabase.cpp:ExecuteBatch > ExecuteBatch FAILED[1] at 3/3: no such table: gone"},
+     "31 / / ok|0/contacts;contacts_by_name;groups;notes/1|Kim|099;3|Park|012/1|Family;2|Work;3|Club\n"
+     "4 DADatabase.cpp:ExecuteBatch > ExecuteBatch SUCCESS[0]: 4 statements\n"
+     "6 DADatabase.cpp:ExecuteBatch > ExecuteBatch FAILED[1] at 5/5: no such table: gone"},
 };
 
 // dir (made if missing) with the seeded t.db.
