@@ -182,6 +182,7 @@ protected:
     {
         static const std::regex kFaultLine(
             "[^6].*|6 .*(out of memory|disk I/O error|unable to open database file)|6 WATCH NOT OPEN|"
+            "6 .*FAILED\\[19\\]: constraint failed|"  // SQLite's own text of 19, its detail not allocated
             "6 (SQLITE STEP|CONVERT TO INT|CONVERT TO DOUBLE) ERROR!!!.*");
         for (const std::string& line : lines) {
             EXPECT_TRUE(std::regex_match(line, kFaultLine) ||

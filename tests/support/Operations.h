@@ -99,45 +99,58 @@ inline const Operation kOperations[] = {
      "1 / / ok|0/contacts;contacts_by_name;groups/1|Cho|NULL;2|Lee|011;3|Park|012/1|Family;2|Work\n"
      "4 DADatabase.cpp:Upsert > Upsert SUCCESS[0]\n"
      "6 DADatabase.cpp:Upsert > Upsert FAILED[1]: no such table: people"},
-    {"update",  // the second changes what the first did again
+    {"update",  // a range; the second changes the same rows again, the failing one leaves the count alone
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAUpdateRequest update;
-         Make(update, dir, "contacts", "phone", "012").SetData("name", "Han");
+         At(update, dir, "contacts").SetData("name", "Han");
+         update.SetWhere("_ID", DACompare::GreaterEqual, 2);
+         update.SetWhere("_ID", DACompare::LessEqual, 3);
          int changes = -1;
          const int rc = RUN(t, Update, update) * 10 + RUN(t, Update, update, changes);
+         const int failed = RUN(t, Update, At(update, dir, "people"), changes);
          Note(cursor, std::to_string(changes));
-         return rc * 10 + RUN(t, Update, Make(update, dir, "people"), changes);  // leaves changes alone
+         return rc * 10 + failed;
      },
      0,
-     "1 / noted 1 / ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Han|012/1|Family;2|Work\n"
+     "1 / noted 2 / ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Han|011;3|Han|012/1|Family;2|Work\n"
      "4 DADatabase.cpp:Update > update SUCCESS[0]\n"
      "4 DADatabase.cpp:Update > update SUCCESS[0]\n"
      "6 DADatabase.cpp:Update > update FAILED[1]: no such table: people"},
-    {"delete",
+    {"delete",  // the second finds nothing
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DADeleteRequest remove;
+         At(remove, dir, "contacts").SetWhere("_ID", DACompare::Less, std::int64_t{2});
          int changes = -1;
-         const int rc = RUN(t, Delete, Make(remove, dir, "contacts")) * 100 + RUN(t, Delete, remove, changes) * 10 +
-             RUN(t, Delete, Make(remove, dir, "people"));
+         const int rc = RUN(t, Delete, remove) * 100 + RUN(t, Delete, remove, changes) * 10;
+         const int failed = RUN(t, Delete, At(remove, dir, "people"), changes);
          Note(cursor, std::to_string(changes));
-         return rc;
+         return rc + failed;
      },
      0,
-     "1 / noted 0 / ok|0/contacts;contacts_by_name;groups/1|Kim|010;3|Park|012/1|Family;2|Work\n"
+     "1 / noted 0 / ok|0/contacts;contacts_by_name;groups/2|Lee|011;3|Park|012/1|Family;2|Work\n"
      "4 DADatabase.cpp:Delete > delete SUCCESS[0]\n"
      "4 DADatabase.cpp:Delete > delete SUCCESS[0]\n"
      "6 DADatabase.cpp:Delete > delete FAILED[1]: no such table: people"},
-    {"insert",
+    {"insert",  // the new row's id; a clash fails with 19 (the id kept) unless ignored (then -1)
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAInsertRequest insert;
          At(insert, dir, "contacts").SetData("name", "Yoo");
-         std::int64_t rowId = -1;
-         const int rc = RUN(t, Insert, insert, rowId);
-         Note(cursor, std::to_string(rowId));
+         std::int64_t id = -2;
+         int rc = RUN(t, Insert, insert, id);
+         std::string ids = std::to_string(id);
+         insert.SetData("_ID", 1);
+         rc = rc * 100 + RUN(t, Insert, insert, id);
+         ids += " " + std::to_string(id);
+         insert.SetIgnoreExisting();
+         rc += RUN(t, Insert, insert, id);
+         Note(cursor, ids + " " + std::to_string(id));
          return rc;
      },
      0,
-     "0 / noted 4 / ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012;4|Yoo|NULL/1|Family;2|Work\n"
+     "19 / noted 4 4 -1 / "
+     "ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012;4|Yoo|NULL/1|Family;2|Work\n"
+     "4 DADatabase.cpp:Insert > Insert SUCCESS[0]\n"
+     "6 DADatabase.cpp:Insert > Insert FAILED[19]: UNIQUE constraint failed: contacts._ID\n"
      "4 DADatabase.cpp:Insert > Insert SUCCESS[0]"},
     {"select",  // the failing one leaves the cursor as it was
      [](Target& t, const std::string& dir, DACursor& cursor) {
