@@ -597,30 +597,6 @@ TEST_F(Faults, KilledMigrationLeavesTheOldVersion)
     EXPECT_EQ("1|200", reader.Query("SELECT (SELECT user_version FROM pragma_user_version), count(*) FROM t"));
 }
 
-// A leaf page in the middle overwritten: Query returns the step's own code
-// with its line, keeping the rows read before; Select keeps its rule (the
-// step failure is logged, not returned).
-TEST_F(Faults, QueryOverADamagedPageReturnsTheStepFailure)
-{
-    RawDb(PathOf("t.db"))
-        .Run("PRAGMA page_size = 4096; CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); WITH RECURSIVE "
-             "n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 200) INSERT INTO t "
-             "SELECT i, printf('%0200d', i) FROM n;");
-    std::fstream(PathOf("t.db"), std::ios::in | std::ios::out | std::ios::binary).seekp(4 * 4096)
-        << std::string(4096, '\x7f');
-    DAQueryRequest query;
-    DASelectRequest select;
-    DACursor cursor;
-    LogCapture log;
-    EXPECT_EQ(11, DADatabase().Query(At(query, Dir(), "t"), cursor));
-    EXPECT_TRUE(cursor.GetCount() > 0 && cursor.GetCount() < 200) << cursor.GetCount();
-    EXPECT_EQ(0, DADatabase().Select(At(select, Dir(), "t"), cursor));
-    EXPECT_EQ((Strings{"6 DADatabasePasrser.cpp:ParseDatabase > SQLITE STEP ERROR!!! SQL logic error",
-                       "6 DADatabase.cpp:Query > QUERY FAILED[11]: database disk image is malformed",
-                       "6 DADatabasePasrser.cpp:ParseDatabase > SQLITE STEP ERROR!!! SQL logic error"}),
-              Described(log));
-}
-
 // Quotes, format and comment characters, separators, UTF-8, control bytes
 // (no NUL), SQL; sometimes empty, sometimes long.
 std::string RandomText(std::mt19937& random)
