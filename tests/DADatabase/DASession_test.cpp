@@ -9,6 +9,7 @@
 #include <regex>
 #include <string>
 #include <thread>
+#include <tuple>
 
 #include <gtest/gtest.h>
 
@@ -60,7 +61,9 @@ protected:
     }
 };
 
-class SessionOperation : public SessionTest, public ::testing::WithParamInterface<Operation> {};
+// A row, and whether the session runs without the log (the rollback
+// journal, every operation on its one connection).
+class SessionOperation : public SessionTest, public ::testing::WithParamInterface<std::tuple<Operation, bool>> {};
 
 }  // namespace
 
@@ -70,34 +73,40 @@ TEST_P(SessionOperation, MatchesDatabase)
 {
     const std::string perCall = Seeded("per_call");
     const std::string held = Seeded("held");
+    const Operation& row = std::get<0>(GetParam());
     DADatabase db;
     DASession session;
+    session.SetWal(!std::get<1>(GetParam()));
     ASSERT_EQ(0, OpenAt(session, held));
     Target viaDb{&db, nullptr};
     Target viaSession{nullptr, &session};
     DACursor expectedRows;
     DACursor rows;
     LogCapture log;
-    const int expected = GetParam().run(viaDb, perCall, expectedRows);
+    const int expected = row.run(viaDb, perCall, expectedRows);
     Strings expectedLines = Described(log);
-    if (GetParam().expected != nullptr) {
-        EXPECT_EQ(GetParam().expected, Summary(expected, expectedRows, perCall, expectedLines));
+    if (row.expected != nullptr) {
+        EXPECT_EQ(row.expected, Summary(expected, expectedRows, perCall, expectedLines));
     }
     for (std::string& line : expectedLines) {
         line = std::regex_replace(line, std::regex("DADatabase\\.cpp"), "DASession.cpp");
         line = std::regex_replace(line, std::regex(perCall), held);
     }
     log.Clear();
-    EXPECT_EQ(expected, GetParam().run(viaSession, held, rows));
+    EXPECT_EQ(expected, row.run(viaSession, held, rows));
     EXPECT_EQ(expectedLines, Described(log));
     EXPECT_EQ(Dump(expectedRows), Dump(rows));
     EXPECT_EQ(Content(perCall), Content(held));  // read while the session holds the file
     session.Close();
     EXPECT_EQ(Content(perCall), Content(held));
+    EXPECT_EQ(std::get<1>(GetParam()) ? "delete" : "wal", RawDb(held + "/t.db").Query("PRAGMA journal_mode"));
 }
 
-INSTANTIATE_TEST_SUITE_P(Every, SessionOperation, ::testing::ValuesIn(Rows()),
-                         [](const auto& info) { return std::string(info.param.name); });
+INSTANTIATE_TEST_SUITE_P(Every, SessionOperation, ::testing::Combine(::testing::ValuesIn(Rows()), ::testing::Bool()),
+                         [](const auto& info) {
+                             return std::string(std::get<0>(info.param).name) +
+                                 (std::get<1>(info.param) ? "_without_log" : "");
+                         });
 
 // Refusals: a closed session, another file, a missing directory, a file
 // that is not a database; each with one line, nothing created.
@@ -222,26 +231,6 @@ TEST_F(SessionTest, ReadsRunAsWrittenFollowTheSessionsSchemaChanges)
         ASSERT_EQ(0, session.Select(select, cursor));
         EXPECT_EQ((Strings{"x"}), ColumnValues(cursor, "a")) << change;
     }
-}
-
-// Without the log: the rollback journal, every operation on the one
-// connection.
-TEST_F(SessionTest, RunsWithoutTheLog)
-{
-    const std::string dir = Seeded("db");
-    DASession session;
-    session.SetWal(false);
-    session.SetSyncOnCommit(false);
-    ASSERT_EQ(0, OpenAt(session, dir));
-    DAUpsertRequest upsert;
-    DASelectRequest select;
-    DACursor cursor;
-    const LogCapture quiet;
-    At(upsert, dir, "groups").SetData("title", "Club");
-    EXPECT_EQ(0, session.Upsert(upsert) + session.Select(At(select, dir, "groups"), cursor));
-    EXPECT_EQ(3, cursor.GetCount());
-    EXPECT_FALSE(FileExists("db/t.db-wal"));
-    EXPECT_EQ("delete", RawDb(dir + "/t.db").Query("PRAGMA journal_mode"));
 }
 
 // Write until the budget is full (13), delete, write again; file and log
