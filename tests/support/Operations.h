@@ -318,6 +318,42 @@ inline const Operation kOperations[] = {
      "4 DADatabase.cpp:DropSearchIndex > DropSearchIndex SUCCESS[0]\n"
      "6 DADatabase.cpp:Search > SEARCH FAILED[1]: no such table: ulo_search_names\n"
      "4 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex SUCCESS[0]"},
+    {"search_index_refused_then_its_table_dropped",  // again: no change; a bad column, table or name: nothing
+     [](Target& t, const std::string& dir, DACursor& cursor) {
+         DASearchIndexRequest index;
+         At(index, dir, "groups").SetName("titles");
+         index.AddColumn("title");
+         int rc = RUN(t, CreateSearchIndex, index) * 10 + RUN(t, CreateSearchIndex, index);
+         index.SetName("other");
+         index.AddColumn("nope");
+         rc = rc * 10 + RUN(t, CreateSearchIndex, index);
+         rc = rc * 10 + RUN(t, CreateSearchIndex, At(index, dir, "missing"));
+         index.SetName("bad name");  // refused, the name kept
+         DADropRequest drop;
+         DASearchRequest search;
+         At(search, dir, "groups").SetIndex("titles");
+         search.SetText("work");
+         rc = rc * 10 + RUN(t, DropTable, At(drop, dir, "groups"));
+         rc = rc * 10 + RUN(t, Search, search, cursor);  // fails as a query does
+         DABasePath at;
+         At(at, dir);
+         for (const char* name : {"titles;", "titles"}) {  // the second removes everything, its table gone
+             rc =
+                 rc * 100 + (t.session != nullptr ? t.session->DropSearchIndex(name) : t.db->DropSearchIndex(at, name));
+         }
+         return rc;
+     },
+     kSteps | kHeavy,
+     "11012100 / / ok|0/contacts;contacts_by_name/1|Kim|010;2|Lee|011;3|Park|012/\n"
+     "4 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex SUCCESS[0]\n"
+     "4 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex SUCCESS[0]\n"
+     "6 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex FAILED[1]: no such column: nope\n"
+     "6 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex FAILED[1]: no such table: missing\n"
+     "6 DASearchIndexRequest.cpp:SetName > INVALID NAME, NOT STORED\n"
+     "4 DADatabase.cpp:DropTable > DropTable SUCCESS[0]\n"
+     "6 DADatabase.cpp:Search > SEARCH FAILED[1]: no such table: groups\n"
+     "6 DADatabase.cpp:DropSearchIndex > DropSearchIndex FAILED[21]: invalid name\n"
+     "4 DADatabase.cpp:DropSearchIndex > DropSearchIndex SUCCESS[0]"},
     {"keeping_rows_counters_row_ids_applied_steps",
      [](Target& t, const std::string& dir, DACursor& cursor) {
          DAUpsertRequest keep;  // updates row 1 in place: its phone stays
