@@ -3,6 +3,7 @@
 #include "DADatabase.h"
 #include "DASession.h"
 #include "DASqlGenerator.h"
+#include "DATypedCursor.h"
 #include "bench.h"
 
 constexpr int kEvents = 100000;
@@ -86,6 +87,13 @@ void bench::ConditionCases(const Location& at)
     DASqlGenerator().GetQuerySql(*rows, sql);
     query("cond/keysetrow" + name + "lib", rows, 50);
     bench::AddQuery("cond/keysetrow" + name + "raw", 50, bench::Raw(path, sql));
+    bench::Add("cond/keysetrow" + name + "typed",
+               [rows] {
+                   DATypedCursor cursor;
+                   const int rc = DADatabase().Query(*rows, cursor);
+                   return rc != SQLITE_OK ? rc : cursor.GetCount() == 50 ? 0 : -1;
+               },
+               {{"rows", 50}});
     // increment: one counter by key, per call, and the same statement through sqlite3_exec.
     auto counter = bench::Request<DAUpdateRequest>(at, "events.db", "counters");
     counter->SetWhere("k", "unread");

@@ -70,6 +70,8 @@ TARGETS = [
     *both("keyset page, {l}: offset / keyset", "cond/keyset/{l}/offset", "lib", ">=", 20),
     *both("keyset page, session, {l}: offset / keyset", "cond/keyset/{l}/sessionoffset", "session", ">=", 20),
     *both("keyset page by (ts, id), {l}: lib / raw", "cond/keysetrow/{l}/lib", "raw", "<=", 1.8),
+    *both("keyset page by (ts, id) into `DATypedCursor`, {l}: lib / raw", "cond/keysetrow/{l}/typed", "raw", "<=",
+          1.3),
     *both("increment a counter by key, {l}: lib / raw", "cond/increment/{l}/lib", "raw", "<=", 1.1),
     *both("unread counts per batch of 100, {l}: recount / counters", "cond/unread/{l}/recount", "counter", ">=", 20),
     *both("`AddColumn`, 100k rows, {l}: lib / raw", "schema/AddColumn100000/{l}/lib", "raw", "<=", 1.2),

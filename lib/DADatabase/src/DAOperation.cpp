@@ -270,29 +270,6 @@ int RunRead(DAConnectionSource& source, DABasePath& location, const char* sql, s
     return rc;
 }
 
-// Statements that land together or not at all ("<func> SUCCESS[0]" or
-// "<func> FAILED[rc]: text", as the write frame logs): sql's statements
-// in one transaction on a connection for writing.
-int RunScript(DAConnectionSource& source, DABasePath& location, const std::string& sql, const char* func)
-{
-    DALease db;
-    int rc = source.Acquire(location, DAAccess::Write, func, db);
-    if (rc != SQLITE_OK) {
-        return rc;
-    }
-    DAErrorText error;
-    int step = 0;
-    const auto none = [] { return SQLITE_OK; };
-    rc = RunTransaction(source, db.get(), sql.c_str(), 1, error, step, none, none);
-    if (rc == SQLITE_OK) {
-        DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "%s SUCCESS[%d]", func, rc);
-    } else {
-        DA_LOG_WHERE(DLOG_ERROR, source.File(), func, source.Line(), "%s FAILED[%d]: %s", func, rc,
-                     FailureText(error, rc));
-    }
-    return rc;
-}
-
 const char* const kReadVersion = "PRAGMA user_version";
 
 // Refuses a table name that is not plain, with the line "<func>
@@ -315,11 +292,17 @@ void AddText(std::string& texts, const std::string& sql)
     texts += '\0';
 }
 
-// A transaction of count texts with finish, logged "<func> SUCCESS[0]" or
-// "<func> FAILED[rc]: text" under func.
-template <typename Finish>
-int RunWatchTransaction(DAConnectionSource& source, DABasePath& location, const char* func, const std::string& texts,
-                        int count, Finish finish)
+struct NoFinish {
+    int operator()(sqlite3* /*db*/, DAErrorText& /*error*/) const { return SQLITE_OK; }
+};
+
+// Statements that land together or not at all: the count NUL-separated
+// texts (a text may hold several statements) and finish(db, error) in one
+// transaction on a connection for writing, logged "<func> SUCCESS[0]" or
+// "<func> FAILED[rc]: text" under func, as the write frame logs.
+template <typename Finish = NoFinish>
+int RunLoggedTransaction(DAConnectionSource& source, DABasePath& location, const char* func, const std::string& texts,
+                         int count, Finish finish = Finish())
 {
     DALease db;
     int rc = source.Acquire(location, DAAccess::Write, func, db);
@@ -631,7 +614,7 @@ int DAOperations::CreateSearchIndex(DAConnectionSource& source, DASearchIndexReq
 {
     std::string sql;
     DASqlGenerator().GetCreateSearchIndexSql(request, sql);
-    return RunScript(source, request, sql, "CreateSearchIndex");
+    return RunLoggedTransaction(source, request, "CreateSearchIndex", sql, 1);
 }
 
 int DAOperations::DropSearchIndex(DAConnectionSource& source, DABasePath& location, char const* name)
@@ -644,7 +627,7 @@ int DAOperations::DropSearchIndex(DAConnectionSource& source, DABasePath& locati
     }
     std::string sql;
     DASqlGenerator().GetDropSearchIndexSql(name, sql);
-    return RunScript(source, location, sql, func);
+    return RunLoggedTransaction(source, location, func, sql, 1);
 }
 
 int DAOperations::Search(DAConnectionSource& source, DASearchRequest& request, DACursor& cursor)
@@ -681,7 +664,7 @@ int DAOperations::Watch(DAConnectionSource& source, DABasePath& location, char c
     const std::string read =
         "SELECT changes, (SELECT schema_version FROM pragma_schema_version) FROM " + counters + " WHERE name = " + name;
     std::array<std::int64_t, 2> values{};
-    const int rc = RunWatchTransaction(source, location, func, texts, 5, [&](sqlite3* db, DAErrorText& error) {
+    const int rc = RunLoggedTransaction(source, location, func, texts, 5, [&](sqlite3* db, DAErrorText& error) {
         return ReadIntegers(source, db, read.c_str(), values, error);
     });
     if (rc == SQLITE_OK) {
@@ -707,7 +690,7 @@ int DAOperations::Unwatch(DAConnectionSource& source, DABasePath& location, char
     const std::string forget = "DELETE FROM " + counters + " WHERE name = '" + table + "'";
     const std::string left = "SELECT count(*) FROM " + counters;
     const std::string drop = "DROP TABLE " + counters;
-    return RunWatchTransaction(source, location, func, texts, 3, [&](sqlite3* db, DAErrorText& error) {
+    return RunLoggedTransaction(source, location, func, texts, 3, [&](sqlite3* db, DAErrorText& error) {
         std::array<std::int64_t, 1> count{};
         int rc = ReadIntegers(source, db, present.c_str(), count, error);
         if (rc != SQLITE_OK || count[0] == 0) {

@@ -10,4 +10,10 @@
 // carry a second statement.
 bool DAIsPlainName(char const* name, bool qualified = false);
 
+// The name setters' one refusal: plain is whether every name the setter
+// takes is plain; when not, logs "INVALID NAME, NOT STORED" (error) under
+// file, func and line, and the setter keeps nothing.
+bool DAKeepNames(bool plain, const char* file, const char* func, int line);
+#define DA_KEEP_NAMES(plain) DAKeepNames((plain), DA_FILE_NAME, __func__, __LINE__)
+
 #endif  // DAPLAINNAME_H

@@ -1,5 +1,7 @@
 #include "DAPlainName.h"
 
+#include "DALog.h"
+
 namespace {
 
 bool IsNameByte(unsigned char byte)
@@ -34,4 +36,12 @@ bool DAIsPlainName(char const* name, bool qualified)
         end = SkipName(end + 1);
     }
     return end != nullptr && *end == '\0';
+}
+
+bool DAKeepNames(bool plain, const char* file, const char* func, int line)
+{
+    if (!plain) {
+        DA_LOG_WHERE(DLOG_ERROR, file, func, line, "INVALID NAME, NOT STORED");
+    }
+    return plain;
 }

@@ -3,30 +3,16 @@
 #include "DALog.h"
 #include "DAPlainName.h"
 
-namespace {
-
-// Names and the type go into the statement unquoted: only plain ones are
-// kept.
-bool IsAccepted(bool plain, const char* func)
-{
-    if (!plain) {
-        DA_LOG_AT(DLOG_ERROR, func, "INVALID NAME, NOT STORED");
-    }
-    return plain;
-}
-
-}  // namespace
-
 void DAAddColumnRequest::SetTable(char const* table)
 {
-    if (IsAccepted(DAIsPlainName(table), __func__)) {
+    if (DA_KEEP_NAMES(DAIsPlainName(table))) {
         m_table.Assign(table);
     }
 }
 
 void DAAddColumnRequest::SetColumn(char const* column, char const* type)
 {
-    if (IsAccepted(DAIsPlainName(column) && DAIsPlainName(type), __func__)) {
+    if (DA_KEEP_NAMES(DAIsPlainName(column) && DAIsPlainName(type))) {
         m_column.Assign(column);
         m_type.Assign(type);
     }

@@ -6,37 +6,23 @@
 #include "DAMemberLock.h"
 #include "DAPlainName.h"
 
-namespace {
-
-// Names go into the statement unquoted: only plain ones are kept.
-bool IsAccepted(char const* name, const char* func)
-{
-    if (DAIsPlainName(name)) {
-        return true;
-    }
-    DA_LOG_AT(DLOG_ERROR, func, "INVALID NAME, NOT STORED");
-    return false;
-}
-
-}  // namespace
-
 void DACreateIndexRequest::SetTable(char const* table)
 {
-    if (IsAccepted(table, __func__)) {
+    if (DA_KEEP_NAMES(DAIsPlainName(table))) {
         m_table.Assign(table);
     }
 }
 
 void DACreateIndexRequest::SetName(char const* name)
 {
-    if (IsAccepted(name, __func__)) {
+    if (DA_KEEP_NAMES(DAIsPlainName(name))) {
         m_name.Assign(name);
     }
 }
 
 void DACreateIndexRequest::AddColumn(char const* column, bool descending)
 {
-    if (!IsAccepted(column, __func__)) {
+    if (!DA_KEEP_NAMES(DAIsPlainName(column))) {
         return;
     }
     DAOwnedString name;

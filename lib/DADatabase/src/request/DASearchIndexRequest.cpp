@@ -6,37 +6,23 @@
 #include "DAMemberLock.h"
 #include "DAPlainName.h"
 
-namespace {
-
-// Names go into the statements unquoted: only plain ones are kept.
-bool IsAccepted(char const* name, const char* func)
-{
-    if (DAIsPlainName(name)) {
-        return true;
-    }
-    DA_LOG_AT(DLOG_ERROR, func, "INVALID NAME, NOT STORED");
-    return false;
-}
-
-}  // namespace
-
 void DASearchIndexRequest::SetTable(char const* table)
 {
-    if (IsAccepted(table, __func__)) {
+    if (DA_KEEP_NAMES(DAIsPlainName(table))) {
         m_table.Assign(table);
     }
 }
 
 void DASearchIndexRequest::SetName(char const* name)
 {
-    if (IsAccepted(name, __func__)) {
+    if (DA_KEEP_NAMES(DAIsPlainName(name))) {
         m_name.Assign(name);
     }
 }
 
 void DASearchIndexRequest::AddColumn(char const* column)
 {
-    if (!IsAccepted(column, __func__)) {
+    if (!DA_KEEP_NAMES(DAIsPlainName(column))) {
         return;
     }
     DAOwnedString name;

@@ -16,8 +16,7 @@ constexpr int kMostWords = 64;
 
 void DASearchRequest::SetIndex(char const* name)
 {
-    if (!DAIsPlainName(name)) {
-        DA_LOG(DLOG_ERROR, "INVALID NAME, NOT STORED");
+    if (!DA_KEEP_NAMES(DAIsPlainName(name))) {
         return;
     }
     m_index.Assign(name);
@@ -30,8 +29,7 @@ void DASearchRequest::SetText(char const* text)
 
 void DASearchRequest::AddSnippet(char const* column, char const* before, char const* after, int words, char const* as)
 {
-    if (!DAIsPlainName(column) || !DAIsPlainName(as)) {
-        DA_LOG(DLOG_ERROR, "INVALID NAME, NOT STORED");
+    if (!DA_KEEP_NAMES(DAIsPlainName(column) && DAIsPlainName(as))) {
         return;
     }
     Snippet snippet{column, before != nullptr ? before : "", after != nullptr ? after : "",
