@@ -68,7 +68,8 @@ class SessionOperation : public SessionTest, public ::testing::WithParamInterfac
 }  // namespace
 
 // The same rows, codes and lines as a per-call DADatabase gives, its file
-// name aside.
+// name aside, and the same file, read while the session holds it and after
+// Close, which leaves no log beside it and the journal mode it set.
 TEST_P(SessionOperation, MatchesDatabase)
 {
     const std::string perCall = Seeded("per_call");
@@ -98,7 +99,9 @@ TEST_P(SessionOperation, MatchesDatabase)
     EXPECT_EQ(Dump(expectedRows), Dump(rows));
     EXPECT_EQ(Content(perCall), Content(held));  // read while the session holds the file
     session.Close();
+    session.Close();  // again: nothing
     EXPECT_EQ(Content(perCall), Content(held));
+    EXPECT_FALSE(FileExists("held/t.db-wal"));  // one file left
     EXPECT_EQ(std::get<1>(GetParam()) ? "delete" : "wal", RawDb(held + "/t.db").Query("PRAGMA journal_mode"));
 }
 
@@ -158,50 +161,6 @@ TEST_F(SessionTest, RefusesWithOneLine)
                           "/t.db")}),
         Described(log));
     EXPECT_EQ(std::string(5000, 'x'), FileBytes(PathOf("text.db")));
-}
-
-// Open in WAL mode; per-call visits see the session's commits and the
-// session sees theirs; Close leaves one file, still in WAL mode.
-TEST_F(SessionTest, SharesTheFileWithPerCallVisitsAndLeavesNoLog)
-{
-    const std::string dir = Seeded("db");
-    DASession session;
-    ASSERT_EQ(0, OpenAt(session, dir));
-    DAUpsertRequest upsert;
-    At(upsert, dir, "groups").SetData("title", "Club");
-    const LogCapture quiet;
-    ASSERT_EQ(0, session.Upsert(upsert));
-    EXPECT_TRUE(FileExists("db/t.db-wal"));
-    DASelectRequest select;
-    DACursor cursor;
-    DADatabase database;
-    ASSERT_EQ(0, database.Select(At(select, dir, "groups"), cursor));
-    EXPECT_EQ((Strings{"Family", "Work", "Club"}), ColumnValues(cursor, "title"));
-    DAUpsertRequest other;
-    At(other, dir, "groups").SetData("title", "Gym");
-    ASSERT_EQ(0, database.Upsert(other));
-    ASSERT_EQ(0, session.Select(select, cursor));
-    EXPECT_EQ(4, cursor.GetCount());
-    // The schema changed by a per-call visit, then by the session: the
-    // session's readers read the new one.
-    for (DADatabase* db : {&database, static_cast<DADatabase*>(nullptr)}) {
-        DADropRequest drop;
-        DACreateRequest create;
-        At(create, dir, "groups").SetColumnKey(db != nullptr ? "badge" : "motto", "TEXT");
-        create.SetColumnKey("title", "TEXT");
-        ASSERT_EQ(0,
-                  db != nullptr ? db->DropTable(At(drop, dir, "groups")) + db->CreateTable(create)
-                                : session.DropTable(At(drop, dir, "groups")) + session.CreateTable(create));
-        ASSERT_EQ(0, RUN((Target{db, db != nullptr ? nullptr : &session}), Upsert, other));
-        ASSERT_EQ(0, session.Select(select, cursor));
-        Strings names;
-        cursor.GetColumn(names);
-        EXPECT_EQ(1, std::count(names.begin(), names.end(), db != nullptr ? "badge" : "motto")) << names.size();
-    }
-    session.Close();
-    session.Close();
-    EXPECT_FALSE(FileExists("db/t.db-wal"));
-    EXPECT_EQ("wal|ok", RawDb(dir + "/t.db").Query("SELECT * FROM pragma_journal_mode, pragma_integrity_check"));
 }
 
 // A text the session cannot keep by shape (a '$' in the table name) is
