@@ -1,12 +1,14 @@
 #!/usr/bin/env python3
 """Rewrites the results in docs/benchmarks.md from Google Benchmark's JSON output; targets are judged on each
-repetition: "yes" when all meet one, "no" when none does, "open" otherwise."""
+repetition: "yes" when all meet one, "no" when none does, "open" otherwise. Draws the typed reads' time per row
+into docs/typed-reads.png when gnuplot is there."""
 
 import argparse
 import json
 import os
 import platform
 import re
+import shutil
 import statistics
 import subprocess
 from collections import defaultdict
@@ -196,6 +198,22 @@ def summary(samples):
     return lines + [""]
 
 
+def plot(samples, png):
+    """Time per row against rows of the typed reads on tmpfs, one line per impl, drawn by gnuplot."""
+    impls = {"raw": "raw SQLite", "lib": "QueryEach", "typedcursor": "DATypedCursor", "dacursor": "DACursor"}
+    data = ""
+    for impl in impls:
+        points = sorted((runs[0]["rows"], median(runs) * 1000 / runs[0]["rows"]) for name, runs in samples.items()
+                        if re.fullmatch(rf"typed/rows\d+/tmpfs/{impl}", name))
+        data += "".join(f"{rows} {ns}\n" for rows, ns in points) + "e\n"
+    if shutil.which("gnuplot") and re.search(r"\d", data):
+        subprocess.run(["gnuplot"], text=True, check=True, input=(
+            f'set terminal png size 800,480; set output "{png}"; set logscale xy; set grid; set key top left; '
+            'set xrange [700:1.4e6]; set format x "%.0f"; set xlabel "rows"; '
+            'set ylabel "ns per row (typed read of every value, tmpfs)"; plot '
+            + ", ".join(f'"-" with linespoints lw 2 title "{title}"' for title in impls.values()) + "\n" + data))
+
+
 def main():
     parser = argparse.ArgumentParser(description=__doc__)
     parser.add_argument("--bench", required=True, help="Google Benchmark's JSON output")
@@ -219,6 +237,7 @@ def main():
     text = re.sub(re.escape(BEGIN) + ".*?" + re.escape(END), lambda _: "\n".join([BEGIN, *lines, END]),
                   open(args.doc).read(), flags=re.S)
     open(args.doc, "w").write(text)
+    plot(samples, os.path.join(os.path.dirname(os.path.abspath(args.doc)), "typed-reads.png"))
 
 
 if __name__ == "__main__":

@@ -138,6 +138,26 @@ TEST_P(TypedValues, EveryTypeThroughEveryWriteReadsBackExactly)
     EXPECT_EQ("1234512345", ids);
 }
 
+// A blob runs bound, yet a write that fails ends as its text would: the
+// statement SQLite refuses, the row it refuses, each with SQLite's text.
+TEST_P(TypedValues, AFailedBlobWriteEndsAsItsText)
+{
+    RawDb(PathOf("t.db")).Run("CREATE TABLE v(id INTEGER PRIMARY KEY, b BLOB CHECK(length(b) < 2))");
+    Open();
+    const unsigned char bytes[] = {1, 2};
+    DAUpsertRequest missing;
+    DAUpsertRequest refused;
+    At(missing, Dir(), "nope").SetBlob("b", bytes, 1);
+    At(refused, Dir(), "v").SetBlob("b", bytes, 2);
+    LogCapture log;
+    EXPECT_EQ(1, ON(Upsert, missing));
+    EXPECT_EQ(19, ON(Upsert, refused));
+    const std::string file = GetParam() ? "DASession.cpp" : "DADatabase.cpp";
+    EXPECT_EQ((Strings{Logged(6, file, "Upsert", "Upsert FAILED[1]: no such table: nope"),
+                       Logged(6, file, "Upsert", "Upsert FAILED[19]: CHECK constraint failed: length(b) < 2")}),
+              Described(log));
+}
+
 // A file the sqlite3 program wrote: every read of every type, with the
 // lines of the reads that fail (NULL fails without one).
 TEST_P(TypedValues, ReadsAFileTheSqlite3ProgramWroteExactly)

@@ -1,5 +1,6 @@
 #include "DAOperation.h"
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <cstdlib>
@@ -15,6 +16,7 @@
 #include "DAPlainName.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
+#include "DAStatementCache.h"
 #include "DAStepRows.h"
 #include "DATypedStore.h"
 #include "DAWatchSchema.h"
@@ -163,7 +165,7 @@ int RunCursorQuery(DAConnectionSource& source, Request& request,
 }
 
 // The typed reads' rows: Query's into a whole store, QueryEach's one at a
-// time into a store whose buffers every row reuses.
+// time, viewed in the statement (no copy of its texts and blobs).
 struct EachRow {
     DATypedStore& store;
     const std::function<bool(DARow const&)>& visit;
@@ -177,9 +179,7 @@ int AppendRow(void* store, sqlite3_stmt* stmt)
 int VisitRow(void* user, sqlite3_stmt* stmt)
 {
     auto& each = *static_cast<EachRow*>(user);
-    each.store.Clear(true);
-    const int rc = each.store.Append(stmt);
-    each.store.position = 0;
+    const int rc = each.store.View(stmt);
     return rc != SQLITE_ROW ? rc : each.visit(each.store.row) ? SQLITE_ROW : SQLITE_DONE;
 }
 
@@ -337,7 +337,43 @@ int DAConnectionSource::Prepare(sqlite3* db, const char* sql, DAStatementLease& 
 
 int DAConnectionSource::Execute(sqlite3* db, const char* sql, DAErrorText& error)
 {
+    std::string shape;
+    std::vector<DALiteral> values;
+    const auto isBlob = [](const DALiteral& value) { return value.kind == DALiteral::Kind::Blob; };
+    if (std::strstr(sql, "X'") != nullptr && DASplitLiterals(sql, shape, values) &&
+        std::any_of(values.begin(), values.end(), isBlob)) {
+        DAStatement stmt;
+        const int rc = DARetryWhileBusy(*this, [&] {
+            sqlite3_stmt* handle = nullptr;
+            const int result = sqlite3_prepare_v2(db, shape.c_str(), -1, &handle, nullptr);
+            stmt.reset(handle);
+            return result;
+        });
+        // A shape SQLite refuses runs as written, and fails as it would.
+        if (rc == SQLITE_OK) {
+            return StepToEnd(db, stmt.get(), DABindLiterals(stmt.get(), values), error);
+        }
+    }
     return ExecWhileBusy(*this, db, sql, error);
+}
+
+int DAConnectionSource::StepToEnd(sqlite3* db, sqlite3_stmt* stmt, int rc, DAErrorText& error)
+{
+    if (rc == SQLITE_OK) {
+        rc = DARetryWhileBusy(*this, [&] {
+            sqlite3_reset(stmt);  // after a busy step; keeps the bindings
+            return sqlite3_step(stmt);
+        });
+        while (rc == SQLITE_ROW) {
+            rc = sqlite3_step(stmt);
+        }
+    }
+    error.reset();
+    if (rc == SQLITE_DONE) {
+        return SQLITE_OK;
+    }
+    error.reset(sqlite3_mprintf("%s", sqlite3_errmsg(db)));
+    return rc;
 }
 
 void DAConnectionSource::Finish(sqlite3_stmt* stmt) noexcept
@@ -455,6 +491,7 @@ int DAOperations::TypedQuery(DAConnectionSource& source, Request& request,
             if (rc != kDAStaleStatement && store.rows == 0) {
                 store.TakeNames(stmt);
             }
+            store.Fit();
             return rc;
         });
 }

@@ -93,7 +93,10 @@ public:
 
     // Runs sql on db to its end under busy-retry, as sqlite3_exec does:
     // returns its code, and on failure error holds SQLite's text (or null
-    // when memory ran out).
+    // when memory ran out). Here a text with a blob literal runs with the
+    // blob bound (SQLite would read it back from its hex digits), as one
+    // statement of its shape with its literals bound; any other text
+    // with sqlite3_exec.
     virtual int Execute(sqlite3* db, const char* sql, DAErrorText& error);
 
     // Ends a statement Prepare handed out; here it is finalized.
@@ -103,6 +106,12 @@ public:
     // a schema that another connection has changed since: not here, where
     // every connection is new; on a held connection, yes.
     virtual bool MayBeStale() const { return false; }
+
+protected:
+    // Execute's end for a statement of sql's shape with its literals bound:
+    // steps stmt to its end under busy-retry when rc is 0 (else stmt is
+    // not used), and returns as Execute, SQLite's text in error.
+    int StepToEnd(sqlite3* db, sqlite3_stmt* stmt, int rc, DAErrorText& error);
 
 private:
     const char* m_file;

@@ -39,7 +39,10 @@ Value ValueAt(const DATypedStore& store, long cell)
 {
     const auto at = static_cast<std::size_t>(cell);
     Value value{static_cast<DAValueType>(store.types[at]), store.values[at], nullptr, 0};
-    if (value.type == DAValueType::Text || value.type == DAValueType::Blob) {
+    if ((value.type == DAValueType::Text || value.type == DAValueType::Blob) && store.live) {
+        value.size = static_cast<std::uint32_t>(value.bits);
+        value.bytes = store.viewed[at];
+    } else if (value.type == DAValueType::Text || value.type == DAValueType::Blob) {
         std::memcpy(&value.size, &store.arena[value.bits], sizeof value.size);
         value.bytes = store.arena.data() + value.bits + sizeof value.size;
     }

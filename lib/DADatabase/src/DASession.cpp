@@ -179,21 +179,7 @@ public:
         if (rc == kAsWritten) {
             return DAConnectionSource::Execute(db, sql, error);
         }
-        if (rc == SQLITE_OK) {
-            rc = DARetryWhileBusy(*this, [&] {
-                sqlite3_reset(stmt.get());  // after a busy step; keeps the bindings
-                return sqlite3_step(stmt.get());
-            });
-            while (rc == SQLITE_ROW) {
-                rc = sqlite3_step(stmt.get());
-            }
-        }
-        error.reset();
-        if (rc == SQLITE_DONE) {
-            return SQLITE_OK;
-        }
-        error.reset(sqlite3_mprintf("%s", sqlite3_errmsg(db)));
-        return rc;
+        return StepToEnd(db, rc == SQLITE_OK ? stmt.get() : nullptr, rc, error);
     }
 
     void Finish(sqlite3_stmt* stmt) noexcept override
@@ -283,28 +269,7 @@ private:
         }
         // The values outlive the statement's use: the cache clears the
         // bindings when it takes the statement back.
-        for (std::size_t i = 0; rc == SQLITE_OK && i < m_values.size(); ++i) {
-            const DALiteral& value = m_values[i];
-            const int index = static_cast<int>(i + 1);
-            rc = Bind(handle, index, value);
-        }
-        return rc;
-    }
-
-    static int Bind(sqlite3_stmt* stmt, int index, const DALiteral& value)
-    {
-        const auto size = static_cast<sqlite3_uint64>(value.text.size());
-        switch (value.kind) {
-        case DALiteral::Kind::Integer:
-            return sqlite3_bind_int64(stmt, index, std::strtoll(value.text.c_str(), nullptr, 10));
-        case DALiteral::Kind::Null:
-            return sqlite3_bind_null(stmt, index);
-        case DALiteral::Kind::Blob:
-            return sqlite3_bind_blob64(stmt, index, value.text.data(), size, SQLITE_STATIC);
-        case DALiteral::Kind::Text:
-            break;
-        }
-        return sqlite3_bind_text64(stmt, index, value.text.data(), size, SQLITE_STATIC, SQLITE_UTF8);
+        return DABindLiterals(handle, m_values);
     }
 
     DASessionState& m_state;

@@ -1,5 +1,6 @@
 #include "DAStatementCache.h"
 
+#include <array>
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
@@ -24,25 +25,40 @@ bool StartsWithDml(const char* sql)
     return false;
 }
 
+constexpr std::size_t kByteValues = 256;
+
+// The value of each upper-case hex digit by byte, -1 for any other byte:
+// a 1 MiB blob is 2 M digits, each read through this table.
+std::array<signed char, kByteValues> HexDigits()
+{
+    std::array<signed char, kByteValues> digits{};
+    for (std::size_t i = 0; i < kByteValues; ++i) {
+        const int b = static_cast<int>(i);
+        digits[i] = static_cast<signed char>(b >= '0' && b <= '9' ? b - '0' : b >= 'A' && b <= 'F' ? b - 'A' + 10 : -1);
+    }
+    return digits;
+}
+
+const std::array<signed char, kByteValues> kHexDigits = HexDigits();
+
 int HexDigit(char c)
 {
-    return c >= '0' && c <= '9' ? c - '0' : c >= 'A' && c <= 'F' ? c - 'A' + 10 : -1;
+    return kHexDigits[static_cast<unsigned char>(c)];
 }
 
 // Reads the blob literal X'..' at c into bytes; returns its end, or null
 // when it is not one (odd or lower-case digits: the text runs as written).
 const char* ReadBlob(const char* c, std::string& bytes)
 {
-    const char* end = c + 2;
-    while (HexDigit(*end) >= 0) {
-        ++end;
-    }
-    if (*end != '\'' || (end - c) % 2 != 0) {
+    const char* digits = c + 2;
+    const std::size_t count = std::strspn(digits, "0123456789ABCDEF");
+    const char* end = digits + count;
+    if (*end != '\'' || count % 2 != 0) {
         return nullptr;
     }
-    bytes.resize(static_cast<std::size_t>(end - c - 2) / 2);
+    bytes.resize(count / 2);
     for (std::size_t i = 0; i < bytes.size(); ++i) {
-        bytes[i] = static_cast<char>(HexDigit(c[2 + 2 * i]) * 16 + HexDigit(c[3 + 2 * i]));
+        bytes[i] = static_cast<char>(HexDigit(digits[2 * i]) * 16 + HexDigit(digits[2 * i + 1]));
     }
     return end + 1;
 }
@@ -58,6 +74,31 @@ bool IsNullValue(const char* c, const std::string& shape)
     return before != std::string::npos && std::strchr("(,=", shape[before]) != nullptr;
 }
 
+// The bytes at which a literal, or a text that runs as written, may begin;
+// any other byte is copied into the shape as it is.
+bool MayStartSomething(char c)
+{
+    switch (c) {
+    case '\0':
+    case 'X':
+    case 'N':
+    case '\'':
+    case '-':
+    case '/':
+    case ';':
+    case '"':
+    case '`':
+    case '[':
+    case '?':
+    case ':':
+    case '@':
+    case '$':
+        return true;
+    default:
+        return c >= '0' && c <= '9';
+    }
+}
+
 }  // namespace
 
 bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>& values)
@@ -66,6 +107,7 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
         return false;
     }
     shape.clear();
+    shape.reserve(std::strlen(sql));
     values.clear();
     for (const char* c = sql; *c != '\0';) {
         const bool glued = c != sql && (IsNameByte(static_cast<unsigned char>(c[-1])) || c[-1] == '.');
@@ -84,13 +126,16 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
                 return false;
             }
             for (++c;; ++c) {
-                if (*c == '\0') {
+                const char* quote = std::strchr(c, '\'');
+                if (quote == nullptr) {
                     return false;  // unterminated: SQLite says so
                 }
-                if (*c == '\'' && *++c != '\'') {
+                literal.text.append(c, quote);
+                c = quote + 1;
+                if (*c != '\'') {
                     break;
                 }
-                literal.text += *c;
+                literal.text += '\'';  // a doubled quote
             }
         } else if (*c >= '0' && *c <= '9' && !glued) {
             // The whole number: digits, a fraction, an exponent.
@@ -116,7 +161,14 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
                    (c[0] == '/' && c[1] == '*')) {
             return false;
         } else {
-            shape += *c++;
+            // This byte starts nothing here, and neither do those after it
+            // up to the next that may.
+            const char* end = c + 1;
+            while (!MayStartSomething(*end)) {
+                ++end;
+            }
+            shape.append(c, end);
+            c = end;
             continue;
         }
         if (IsNameByte(static_cast<unsigned char>(*c)) || values.size() == kMaxLiterals) {
@@ -126,6 +178,31 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
         shape += '?';
     }
     return true;
+}
+
+int DABindLiterals(sqlite3_stmt* stmt, const std::vector<DALiteral>& values)
+{
+    int rc = SQLITE_OK;
+    for (std::size_t i = 0; rc == SQLITE_OK && i < values.size(); ++i) {
+        const DALiteral& value = values[i];
+        const int index = static_cast<int>(i + 1);
+        const auto size = static_cast<sqlite3_uint64>(value.text.size());
+        switch (value.kind) {
+        case DALiteral::Kind::Integer:
+            rc = sqlite3_bind_int64(stmt, index, std::strtoll(value.text.c_str(), nullptr, 10));
+            break;
+        case DALiteral::Kind::Null:
+            rc = sqlite3_bind_null(stmt, index);
+            break;
+        case DALiteral::Kind::Blob:
+            rc = sqlite3_bind_blob64(stmt, index, value.text.data(), size, SQLITE_STATIC);
+            break;
+        case DALiteral::Kind::Text:
+            rc = sqlite3_bind_text64(stmt, index, value.text.data(), size, SQLITE_STATIC, SQLITE_UTF8);
+            break;
+        }
+    }
+    return rc;
 }
 
 sqlite3_stmt* DAStatementCache::Take(const std::string& shape)

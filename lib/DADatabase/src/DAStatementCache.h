@@ -39,6 +39,11 @@ struct DALiteral {
 // texts run as they are.
 bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>& values);
 
+// Binds values to stmt's parameters 1..n, each as its kind (a text as
+// text, as SQLite reads a text literal); the values must outlive the
+// statement's use. Returns 0, or the first binding's failure.
+int DABindLiterals(sqlite3_stmt* stmt, const std::vector<DALiteral>& values);
+
 // Up to kCapacity statements of one connection by shape, the most recently
 // used first. A statement taken out is the caller's until it is put back,
 // so one connection never runs one statement twice at once. Destroy (or

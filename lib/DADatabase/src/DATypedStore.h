@@ -2,9 +2,10 @@
 #define DATYPEDSTORE_H
 
 // The storage of typed rows, behind DATypedCursor (every row of a result)
-// and QueryEach (one row at a time, its buffers reused): per value a type
-// byte and 8 bytes (the integer, the double's bits, or for a text or blob
-// its offset in the byte arena, where a 4-byte size precedes the bytes).
+// and QueryEach (one row at a time, viewed where SQLite keeps it): per value
+// a type byte and 8 bytes (the integer, the double's bits, or for a text or
+// blob its offset in the byte arena, where a 4-byte size precedes the
+// bytes; in a viewed row its size, its bytes' address in viewed).
 
 #include <cstdint>
 #include <string>
@@ -28,6 +29,15 @@ struct DATypedStore {
     // give a text or blob.
     int Append(sqlite3_stmt* stmt);
 
+    // Makes stmt's current row the only row, its texts and blobs read
+    // where SQLite keeps them, so valid until stmt steps on. Returns as
+    // Append.
+    int View(sqlite3_stmt* stmt);
+
+    // Gives back the buffers' unused capacity once it is worth a copy: a
+    // cursor holds its result as long as the app keeps it.
+    void Fit();
+
     // Takes stmt's column names when no row gave them.
     void TakeNames(sqlite3_stmt* stmt);
 
@@ -35,6 +45,8 @@ struct DATypedStore {
     std::vector<unsigned char> types;  // DAValueType per value, row after row
     std::vector<std::uint64_t> values;
     std::vector<unsigned char> arena;
+    std::vector<const unsigned char*> viewed;  // per value of a viewed row
+    bool live = false;  // the row is viewed, not stored
     int rows = 0;
     int position = -1;
     DARow row{this};
