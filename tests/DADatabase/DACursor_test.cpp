@@ -30,60 +30,9 @@ std::string Line(int priority, const char* function, const char* message)
 }
 
 const std::string kLastRow = Line(4, "MoveToNext", "Last Row");
-const std::string kFirstRow = Line(4, "MoveToPrev", "First Row");
-const std::string kInvalid = Line(6, "MoveToPosition", "Invalid Position");
 const std::string kRange = Line(6, "GetString", "CURSOR RANGE ERROR!!!");
 
-// One move and what it must give: its result (kVoid for MoveToFirst and
-// MoveToLast, which return nothing) and the position afterwards.
-enum Move { kNext, kPrev, kFirst, kLast, kTo };
-constexpr int kVoid = -100;
-struct Step {
-    Move move;
-    int rc;
-    int position;
-    int row = 0;  // for kTo
-};
-
-void Walk(DACursor& cursor, const std::vector<Step>& steps)
-{
-    const std::function<int(DACursor&, int)> moves[] = {
-        [](DACursor& c, int) { return c.MoveToNext(); },
-        [](DACursor& c, int) { return c.MoveToPrev(); },
-        [](DACursor& c, int) { return c.MoveToFirst(), kVoid; },
-        [](DACursor& c, int) { return c.MoveToLast(), kVoid; },
-        [](DACursor& c, int row) { return c.MoveToPosition(row); },
-    };
-    for (std::size_t i = 0; i < steps.size(); ++i) {
-        EXPECT_EQ(steps[i].rc, moves[steps[i].move](cursor, steps[i].row)) << "step " << i;
-        EXPECT_EQ(steps[i].position, cursor.GetPosition()) << "step " << i;
-    }
-}
-
 }  // namespace
-
-TEST(DACursorNavigation, ThreeRowsThenInitialize)
-{
-    LogCapture log;
-    DACursor cursor;
-    Load(cursor, {"b", "a"}, {{"b0", "a0"}, {"b1", "a1"}, {"b2", "a2"}});
-    Strings names;
-    EXPECT_EQ(0, cursor.GetColumn(names));
-    EXPECT_EQ((Strings{"b", "a"}), names);  // registration order
-    EXPECT_EQ(3, cursor.GetCount());
-    Walk(cursor, {{kNext, 0, 0}, {kNext, 0, 1}, {kNext, 0, 2}, {kNext, 3, 2}, {kNext, 3, 2}, {kLast, kVoid, 3}});
-    std::string value = "untouched";
-    EXPECT_EQ(1, cursor.GetString("a", value));  // after the last row
-    EXPECT_EQ("untouched", value);
-    Walk(cursor, {{kPrev, 0, 2}, {kPrev, 0, 1}, {kPrev, 0, 0}, {kPrev, 2, 0}, {kFirst, kVoid, -1}, {kPrev, 2, 0}});
-    Walk(cursor, {{kLast, kVoid, 3}, {kNext, 3, 2}, {kTo, 0, 1, 1}, {kTo, 1, 1, 3}, {kTo, 1, 1, -1}, {kTo, 0, 2, 2}});
-    EXPECT_EQ((Strings{kLastRow, kLastRow, kRange, kFirstRow, kFirstRow, kLastRow, kInvalid, kInvalid}),
-              Described(log));
-    cursor.Initialize();
-    EXPECT_EQ(-1, cursor.GetCount());
-    EXPECT_EQ(1, cursor.GetColumn(names));
-    EXPECT_EQ(-1, cursor.GetPosition());
-}
 
 // The count is the length of the second column in name order, or of the only
 // column. A name registered again keeps its values and shows twice; a value

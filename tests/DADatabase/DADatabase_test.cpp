@@ -1,6 +1,9 @@
 #include "DADatabase.h"
 
 #include <chrono>
+#include <cstdint>
+#include <filesystem>
+#include <fstream>
 #include <functional>
 #include <iterator>
 #include <stdexcept>
@@ -32,61 +35,6 @@ void Preload(DACursor& cursor)
     cursor.SetData("mine", "kept");
 }
 
-// One write operation: it succeeds on seed, leaving checked as the rows of
-// check; after breaking it fails with SQLite's failureText.
-struct WriteCase {
-    const char* function;
-    const char* word;  // of its log lines
-    const char* seed;
-    const char* check;
-    const char* checked;
-    const char* breaking;
-    const char* failureText;
-    std::function<int(DADatabase&, const std::string&)> run;
-};
-
-const char* const kNoContacts = "DROP TABLE IF EXISTS contacts";
-const WriteCase kWriteCases[] = {
-    {"DropTable", "DropTable", kContacts, "SELECT count(*) FROM sqlite_master", "0", "", "no such table: contacts",
-     [](DADatabase& db, const std::string& dir) {
-         DADropRequest request;
-         return db.DropTable(At(request, dir, "contacts"));
-     }},
-    {"Update", "update", kContacts, "SELECT name, phone FROM contacts ORDER BY _ID", "Park|010;Lee|011", kNoContacts,
-     "no such table: contacts",
-     [](DADatabase& db, const std::string& dir) {
-         DAUpdateRequest request;
-         At(request, dir, "contacts").SetData("name", "Park");
-         request.SetWhere("phone", "010");
-         return db.Update(request);
-     }},
-    {"Delete", "delete", kContacts, "SELECT name, phone FROM contacts ORDER BY _ID", "Lee|011", kNoContacts,
-     "no such table: contacts",
-     [](DADatabase& db, const std::string& dir) {
-         DADeleteRequest request;
-         At(request, dir, "contacts").SetWhere("phone", "010");
-         return db.Delete(request);
-     }},
-    {"Upsert", "Upsert", kContacts, "SELECT _ID, name, phone FROM contacts ORDER BY _ID", "1|Cho|012;2|Lee|011",
-     kNoContacts, "no such table: contacts",
-     [](DADatabase& db, const std::string& dir) {
-         DAUpsertRequest request;  // replaces the row whose key exists
-         At(request, dir, "contacts").SetData("_ID", 1);
-         request.SetData("name", "Cho");
-         request.SetData("phone", "012");
-         return db.Upsert(request);
-     }},
-    {"CreateTable", "createTable", "", "SELECT sql FROM sqlite_master",
-     "CREATE TABLE groups (_ID INTEGER PRIMARY KEY, title TEXT)",
-     "DROP TABLE groups; CREATE TABLE other(x); CREATE INDEX groups ON other(x);",
-     "there is already an index named groups",
-     [](DADatabase& db, const std::string& dir) {
-         DACreateRequest request;
-         At(request, dir, "groups").SetColumnKey("title", "TEXT");
-         return db.CreateTable(request);
-     }},
-};
-
 class DADatabaseTest : public TempDirTest {
 protected:
     void Seed(const std::string& sql)
@@ -97,33 +45,20 @@ protected:
     }
     std::string Query(const std::string& sql) { return RawDb(PathOf(kFile)).Query(sql); }
 
+    // Sets row 1 to Cho, 012.
+    int Upsert(const std::string& dir)
+    {
+        DAUpsertRequest request;
+        At(request, dir, "contacts").SetData("_ID", 1);
+        request.SetData("name", "Cho");
+        request.SetData("phone", "012");
+        return m_db.Upsert(request);
+    }
+
     DADatabase m_db;
 };
 
-class DADatabaseWrite : public DADatabaseTest, public ::testing::WithParamInterface<WriteCase> {};
-
 }  // namespace
-
-// The success line, or the failure line with SQLite's text; the file is
-// created when missing and closed again either way.
-TEST_P(DADatabaseWrite, SucceedsOrFailsWithOneLine)
-{
-    const WriteCase& c = GetParam();
-    Seed(c.seed);
-    const int descriptors = OpenDescriptorCount();
-    LogCapture log;
-    EXPECT_EQ(0, c.run(m_db, Dir()));
-    EXPECT_EQ(c.checked, Query(c.check));
-    Seed(c.breaking);
-    EXPECT_EQ(1, c.run(m_db, Dir()));
-    EXPECT_EQ((Strings{Line(4, c.function, std::string(c.word) + " SUCCESS[0]"),
-                       Line(6, c.function, std::string(c.word) + " FAILED[1]: " + c.failureText)}),
-              Described(log));
-    EXPECT_EQ(descriptors, OpenDescriptorCount());
-}
-
-INSTANTIATE_TEST_SUITE_P(Operations, DADatabaseWrite, ::testing::ValuesIn(kWriteCases),
-                         [](const ::testing::TestParamInfo<WriteCase>& info) { return info.param.function; });
 
 // Another connection holds the file exclusively for the whole call: the
 // statement is tried 17 times, with 15 pauses of 100 ms. A Select is busy
@@ -135,7 +70,7 @@ TEST_F(DADatabaseTest, BusyWriteAndSelectGiveUpOrSucceedOnceTheOtherConnectionCo
     holder.Run("BEGIN EXCLUSIVE");
     LogCapture log;
     const auto start = std::chrono::steady_clock::now();
-    EXPECT_EQ(5, kWriteCases[3].run(m_db, Dir()));
+    EXPECT_EQ(5, Upsert(Dir()));
     const double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
     Strings expected = BusyWarnings("DADatabase.cpp", 15);
     expected.push_back(Line(6, "IsRetryLimit", "RETRY COUNT is reached LIMIT, SQLITE_BUSY"));
@@ -159,7 +94,7 @@ TEST_F(DADatabaseTest, BusyWriteAndSelectGiveUpOrSucceedOnceTheOtherConnectionCo
         std::this_thread::sleep_for(std::chrono::milliseconds(250));
         holder.Run("COMMIT");
     });
-    EXPECT_EQ(0, kWriteCases[3].run(m_db, Dir()));
+    EXPECT_EQ(0, Upsert(Dir()));
     release.join();
     Strings lines = Described(log);
     ASSERT_GE(lines.size(), 2U);
@@ -168,66 +103,6 @@ TEST_F(DADatabaseTest, BusyWriteAndSelectGiveUpOrSucceedOnceTheOtherConnectionCo
     lines.pop_back();
     EXPECT_EQ(BusyWarnings("DADatabase.cpp", static_cast<int>(lines.size())), lines);
     EXPECT_EQ("Cho|012;Lee|011", Query("SELECT name, phone FROM contacts ORDER BY _ID"));
-}
-
-// Matching rows replace the cursor's content, no row empties it, and a
-// failure leaves it as it was.
-TEST_F(DADatabaseTest, SelectReadsMatchingRowsIntoTheCursor)
-{
-    Seed(kContacts);
-    DASelectRequest request;
-    At(request, Dir(), "contacts").SetWhere("phone", "011");
-    DACursor cursor;
-    Preload(cursor);
-    LogCapture log;
-    EXPECT_EQ(0, m_db.Select(request, cursor));
-    Strings names;
-    EXPECT_EQ(0, cursor.GetColumn(names));
-    EXPECT_EQ((Strings{"_ID", "name", "phone"}), names);
-    EXPECT_EQ(Strings{"Lee"}, ColumnValues(cursor, "name"));
-
-    log.Clear();
-    DASelectRequest none;
-    At(none, Dir(), "contacts").SetWhere("name", "Nobody");
-    EXPECT_EQ(0, m_db.Select(none, cursor));
-    EXPECT_EQ(-1, cursor.GetCount());
-    EXPECT_EQ(-1, cursor.GetPosition());
-    Preload(cursor);
-    EXPECT_EQ(1, m_db.Select(At(none, Dir(), "x"), cursor));
-    EXPECT_EQ(Strings{"kept"}, ColumnValues(cursor, "mine"));
-    EXPECT_EQ((Strings{Line(6, "Select", "SELECT FAILED[1]: no such table: x"),
-                       Logged(4, "DACursor.cpp", "MoveToNext", "Last Row")}),
-              Described(log));
-}
-
-// Both tables carry the _ID column of tables made without a key, so the join
-// yields _ID twice; it sorts first among the names, and the count stays the
-// number of rows.
-TEST_F(DADatabaseTest, JoinSelectRegistersTheSharedColumnTwice)
-{
-    Seed("CREATE TABLE groups (_ID INTEGER PRIMARY KEY, title TEXT);"
-         "CREATE TABLE contacts (_ID INTEGER PRIMARY KEY, name TEXT, group_id INTEGER);"
-         "INSERT INTO groups(title) VALUES ('Family'), ('Work');"
-         "INSERT INTO contacts(name, group_id) VALUES ('Kim', 1), ('Lee', 2), ('Park', 1);");
-    DAJoinRequest join;
-    join.SetPath(Dir().c_str(), kFile);
-    join.SetLeftJoin("contacts", "group_id");
-    join.SetRightJoin("groups", "_ID");
-    DACursor cursor;
-    LogCapture log;
-    EXPECT_EQ(0, m_db.JoinSelect(join, cursor));
-    Strings names;
-    EXPECT_EQ(0, cursor.GetColumn(names));
-    EXPECT_EQ((Strings{"_ID", "name", "group_id", "_ID", "title"}), names);
-    EXPECT_EQ(3, cursor.GetCount());
-    // _ID's one list takes both values of each row (1,1 2,2 3,1); rows read its head.
-    EXPECT_EQ((Strings{"1", "1", "2"}), ColumnValues(cursor, "_ID"));
-    join.SetLeftJoin("people", "group_id");
-    EXPECT_EQ(1, m_db.JoinSelect(join, cursor));
-    EXPECT_EQ(3, cursor.GetCount());
-    EXPECT_EQ((Strings{Logged(4, "DACursor.cpp", "MoveToNext", "Last Row"),
-                       Line(6, "JoinSelect", "JoinSelect FAILED[1]: no such table: people")}),
-              Described(log));
 }
 
 // A null name throws, and the file is closed on the way out.
@@ -274,14 +149,20 @@ TEST_F(DADatabaseTest, OpenDBHandsBackNullOnFailureAndEveryOperationItsCode)
     DAJoinRequest join;
     join.SetPath(missing.c_str(), kFile);
     bool exists = true;
-    for (const WriteCase& write : kWriteCases) {
-        EXPECT_EQ(14, write.run(m_db, missing)) << write.function;
-    }
+    DAUpdateRequest update;
+    DADeleteRequest remove;
+    DADropRequest drop;
+    DACreateRequest create;
+    EXPECT_EQ(14, Upsert(missing));
+    EXPECT_EQ(14, m_db.Update(At(update, missing, "contacts")));
+    EXPECT_EQ(14, m_db.Delete(At(remove, missing, "contacts")));
+    EXPECT_EQ(14, m_db.DropTable(At(drop, missing, "contacts")));
+    EXPECT_EQ(14, m_db.CreateTable(At(create, missing, "contacts")));
     EXPECT_EQ(14, m_db.Select(At(select, missing, "contacts"), cursor));
     EXPECT_EQ(14, m_db.Query(At(query, missing, "contacts"), cursor));
     EXPECT_EQ(14, m_db.JoinSelect(join, cursor));
     EXPECT_EQ(14, m_db.CheckExistTable(join, "contacts", exists));
-    Strings expected(1 + std::size(kWriteCases) + 1, kOpenFailed);  // OpenDB's own, each write's, Select's
+    Strings expected(1 + 5 + 1, kOpenFailed);  // OpenDB's own, each write's, Select's
     expected.insert(expected.end(),
                     {Line(4, "Select", "OpenDB Error: 14"), kOpenFailed, Line(4, "Query", "OpenDB Error: 14"),
                      kOpenFailed, kOpenFailed});
@@ -289,4 +170,42 @@ TEST_F(DADatabaseTest, OpenDBHandsBackNullOnFailureAndEveryOperationItsCode)
     EXPECT_EQ(Strings{"kept"}, ColumnValues(cursor, "mine"));
     EXPECT_TRUE(exists);
     EXPECT_FALSE(FileExists("missing"));
+}
+
+// Half the rows deleted: their pages are free, and Compact gives them back
+// to the file system with every other row kept. Reads of a file that is
+// not a database leave their outputs alone.
+TEST_F(DADatabaseTest, CompactReturnsTheSpaceOfDeletedRows)
+{
+    Seed("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 "
+         "FROM n WHERE i < 4000) INSERT INTO t SELECT i, printf('%0200d', i) FROM n; DELETE FROM t WHERE k > 2000;");
+    const std::string rows = Query("SELECT count(*), sum(k), sum(length(v)) FROM t");
+    DABasePath location;
+    At(location, Dir());
+    std::int64_t fileBytes = -1;
+    std::int64_t freeBytes = -1;
+    EXPECT_EQ(0, m_db.GetSpace(location, fileBytes, freeBytes));
+    const auto size = static_cast<std::int64_t>(std::filesystem::file_size(PathOf(kFile)));
+    EXPECT_EQ(size, fileBytes);
+    EXPECT_GT(freeBytes, size * 2 / 5);
+    LogCapture log;
+    EXPECT_EQ(0, m_db.Compact(location));
+    std::int64_t freeAfter = -1;
+    EXPECT_EQ(0, m_db.GetSpace(location, fileBytes, freeAfter));
+    EXPECT_EQ(0, freeAfter);
+    EXPECT_LE(fileBytes, size - freeBytes);
+    EXPECT_EQ(static_cast<std::int64_t>(std::filesystem::file_size(PathOf(kFile))), fileBytes);
+    EXPECT_EQ(rows, Query("SELECT count(*), sum(k), sum(length(v)) FROM t"));
+
+    std::ofstream(PathOf("text.db")) << std::string(5000, 'x');
+    location.SetPath(Dir().c_str(), "text.db");
+    int version = -1;
+    EXPECT_EQ(26, m_db.GetSpace(location, fileBytes, freeAfter));
+    EXPECT_EQ(26, m_db.GetVersion(location, version));
+    EXPECT_EQ(-1, version);
+    EXPECT_EQ(0, freeAfter);
+    EXPECT_EQ((Strings{Line(4, "Compact", "Compact SUCCESS[0]"),
+                       Line(6, "GetSpace", "GetSpace FAILED[26]: file is not a database"),
+                       Line(6, "GetVersion", "GetVersion FAILED[26]: file is not a database")}),
+              Described(log));
 }

@@ -65,34 +65,6 @@ int Query(const std::string& dir, const char* table, bool descending, int offset
     return DADatabase().Query(request, cursor);
 }
 
-// Five rows stored out of order, read two at a time in both directions.
-TEST_F(DAQueryFile, PagesInBothDirectionsThenPastTheEndAndFailures)
-{
-    RawDb(PathOf("q.db"))
-        .Run("CREATE TABLE items(n INTEGER, label TEXT);"
-             "INSERT INTO items VALUES (3, 'c'), (1, 'a'), (5, 'e'), (2, 'b'), (4, 'd');");
-    const std::vector<Strings> pages[] = {{{"a", "b"}, {"c", "d"}, {"e"}, {}}, {{"e", "d"}, {"c", "b"}, {"a"}, {}}};
-    for (int page = 0; page < 4; ++page) {
-        for (const bool descending : {false, true}) {
-            DACursor cursor;
-            cursor.SetColumn("mine");  // emptied by the query, even for a page past the end
-            EXPECT_EQ(0, Query(Dir(), "items", descending, page * 2, cursor));
-            EXPECT_EQ(page == 3 ? -1 : static_cast<int>(pages[descending][page].size()), cursor.GetCount());
-            EXPECT_EQ(pages[descending][page], ColumnValues(cursor, "label"));
-        }
-    }
-    DACursor kept;
-    kept.SetColumn("mine");
-    LogCapture log;
-    EXPECT_EQ(1, Query(Dir(), "missing", false, 0, kept));
-    EXPECT_EQ(14, Query(PathOf("none"), "items", false, 0, kept));
-    EXPECT_EQ(0, kept.GetCount());
-    EXPECT_EQ((Strings{"6 DADatabase.cpp:Query > QUERY FAILED[1]: no such table: missing",
-                       "6 DADatabase.cpp:OpenDB > DB open failed. Error no(14): unable to open database file",
-                       "4 DADatabase.cpp:Query > OpenDB Error: 14"}),
-              Described(log));
-}
-
 // Which overload a call SetData("c", T) picks, found by the compiler: each
 // probe hides one overload behind a deleted twin, so a call that picked it
 // no longer compiles; kNone: no call compiles (ambiguous).

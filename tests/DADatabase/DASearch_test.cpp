@@ -37,8 +37,6 @@ protected:
         m_log.Clear();
     }
 
-    std::string Schema() { return RawDb(PathOf("t.db")).Query("SELECT name FROM sqlite_master ORDER BY name"); }
-
     // The code, then the ids of the rows found in id order: "0: 1 3".
     std::string Ids(const char* index, const std::string& text, bool prefix = false)
     {
@@ -149,44 +147,6 @@ TEST_P(SearchWriter, OldWordsFindNothing)
 
 INSTANTIATE_TEST_SUITE_P(Recursive, SearchWriter, ::testing::Values("0", "1"),
                          [](const auto& info) { return std::string("recursive_triggers_") + info.param; });
-
-// Creating again changes nothing; a missing table or column fails with
-// SQLite's code and text, leaving nothing; with its table dropped a search
-// fails as a query does, and dropping the index still removes everything.
-TEST_F(SearchTest, CreateAndDropLeaveNothingBehind)
-{
-    const std::string created = Schema();
-    DASearchIndexRequest index;
-    At(index, Dir(), "messages").SetName("words");
-    index.AddColumn("body");
-    EXPECT_EQ(0, m_db.CreateSearchIndex(index));
-    EXPECT_EQ("6", RawDb(PathOf("t.db")).Query("SELECT COUNT(*) FROM ulo_search_words"));
-    index.SetName("other");
-    index.AddColumn("nope");
-    EXPECT_EQ(1, m_db.CreateSearchIndex(index));
-    index.SetTable("missing");
-    EXPECT_EQ(1, m_db.CreateSearchIndex(index));
-    index.SetName("bad name");
-    EXPECT_EQ(created, Schema());
-    RawDb(PathOf("t.db")).Run("DROP TABLE messages");
-    EXPECT_EQ("1:", Ids("words", "cafe"));
-    DABasePath file;
-    EXPECT_EQ(0, m_db.DropSearchIndex(At(file, Dir()), "words") + m_db.DropSearchIndex(file, "subs"));
-    EXPECT_EQ(21, m_db.DropSearchIndex(file, "subs;"));
-    EXPECT_EQ("", Schema());
-    const auto db = [](int priority, const char* function, const std::string& message) {
-        return Logged(priority, "DADatabase.cpp", function, message);
-    };
-    EXPECT_EQ((Strings{db(4, "CreateSearchIndex", "CreateSearchIndex SUCCESS[0]"),
-                       db(6, "CreateSearchIndex", "CreateSearchIndex FAILED[1]: no such column: nope"),
-                       db(6, "CreateSearchIndex", "CreateSearchIndex FAILED[1]: no such table: missing"),
-                       Logged(6, "DASearchIndexRequest.cpp", "SetName", "INVALID NAME, NOT STORED"),
-                       db(6, "Search", "SEARCH FAILED[1]: no such table: messages"),
-                       db(4, "DropSearchIndex", "DropSearchIndex SUCCESS[0]"),
-                       db(4, "DropSearchIndex", "DropSearchIndex SUCCESS[0]"),
-                       db(6, "DropSearchIndex", "DropSearchIndex FAILED[21]: invalid name")}),
-              Described(m_log));
-}
 
 // Best first, with snippets; conditions on the table's columns narrow,
 // sort keys replace the rank, the page applies.

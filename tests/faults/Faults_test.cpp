@@ -11,6 +11,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
@@ -18,6 +19,7 @@
 #include <functional>
 #include <iterator>
 #include <new>
+#include <optional>
 #include <random>
 #include <regex>
 #include <tuple>
@@ -27,6 +29,7 @@
 #include "DASession.h"
 #include "DatabaseTestUtil.h"
 #include "FaultFs.h"
+#include "Operations.h"
 #include "TempDirTest.h"
 #include "dlog.h"
 
@@ -86,172 +89,271 @@ void Sink(int /*logId*/, int prio, const char* /*tag*/, const char* text, void* 
     g_failAt = armed;
 }
 
-// Through DADatabase, or through a session opened and closed around each
-// operation (so that the session's open and close fail too).
-class AllocFailure : public TempDirTest, public ::testing::WithParamInterface<std::tuple<Allocator, bool>> {};
+// The fault kinds; each is one loop over the table of operations, through
+// a connection source (per call or a session).
+enum Kind { kSqliteMalloc, kOperatorNew, kIoError, kKill, kPowerCut };
+const char* const kKindNames[] = {"sqlite_malloc", "operator_new", "io_error", "kill", "power_cut"};
 
-int CheckExist(DADatabase& db, DABasePath& location, const char* table, bool& exists)
-{
-    return db.CheckExistTable(location, table, exists);
-}
-int CheckExist(DASession& session, DABasePath& /*location*/, const char* table, bool& exists)
-{
-    return session.CheckExistTable(table, exists);
-}
+// What a row gives without a fault.
+struct Outcome {
+    int rc;
+    Strings lines;
+    std::string content;
+    Strings cells;
+    std::string bytes;  // of the file, which has the content when no journal or log is beside it
+};
 
-TEST_P(AllocFailure, FailsCleanlyAtEveryAllocationAndStaysUsable)
+class FaultDriver : public TempDirTest, public ::testing::WithParamInterface<std::tuple<Kind, bool>> {
+protected:
+    void SetUp() override
+    {
+        TempDirTest::SetUp();
+        m_seed = PathOf("seed.db");
+        RawDb(m_seed).Run(kSeed);
+        m_before = Content(Seeded(PathOf("before")));
+        m_beforeBytes = FileBytes(m_seed);
+        dlog_set_sink(&Sink, nullptr);
+    }
+    void TearDown() override
+    {
+        dlog_set_sink(nullptr, nullptr);
+        TempDirTest::TearDown();
+    }
+
+    // Runs row at dir, through a session opened there first (its failure is
+    // the result; it stays open) or per call.
+    int Run(const Operation& row, const std::string& dir, DASession& session, DACursor& cursor) const
+    {
+        DADatabase db;
+        Target target{&db, nullptr};
+        if (std::get<1>(GetParam())) {
+            DABasePath at;
+            const int rc = session.Open(At(at, dir));
+            if (rc != SQLITE_OK) {
+                return rc;
+            }
+            target = {nullptr, &session};
+        }
+        return row.run(target, dir, cursor);
+    }
+
+    // The row without a fault, on a fresh copy of the seed at dir.
+    Outcome Normal(const Operation& row, const std::string& dir) const
+    {
+        mkdir(dir.c_str(), 0700);
+        Reseed(dir, m_seed);
+        DASession session;
+        DACursor cursor;
+        g_lines.clear();
+        const int rc = Run(row, dir, session, cursor);
+        session.Close();
+        return {rc, std::exchange(g_lines, {}), Content(dir), Cells(cursor), FileBytes(dir + "/t.db")};
+    }
+
+    // A write through the same source (the session if it is open) that
+    // another connection sees: no fault leaves a transaction open.
+    void ExpectWriteSeen(const std::string& dir, DASession& session) const
+    {
+        DACreateRequest mark;
+        At(mark, dir, "mark").SetColumnKey("x", "TEXT");
+        DABasePath at;
+        const bool held = std::get<1>(GetParam());
+        if (held && session.IsOpen()) {  // open only with the log in effect
+            EXPECT_EQ("wal", RawDb(dir + "/t.db").Query("PRAGMA journal_mode"));
+        }
+        EXPECT_EQ(0,
+                  !held ? DADatabase().CreateTable(mark)
+                        : (session.IsOpen() ? 0 : session.Open(At(at, dir))) + session.CreateTable(mark));
+        if (held) {
+            EXPECT_EQ("1", RawDb(dir + "/t.db").Query("SELECT count(*) FROM sqlite_master WHERE name = 'mark'"));
+        }
+        session.Close();
+    }
+
+    // What must hold once a fault met row (the fault disarmed): a code, the
+    // normal one only when the row ran through; each line one the row
+    // writes anyway or one error line of the fault; the file as before the
+    // row or as after it, as after it once the row gave its code; when it
+    // also wrote its lines, the rows read a prefix of the normal ones (a
+    // text SQLite could not give read as ""); the source usable. Returns the
+    // cells read as "".
+    int Check(const Operation& row, const Outcome& normal, int rc, const Strings& lines, const Strings& cells,
+              const std::string& dir, DASession& session) const
+    {
+        static const std::regex kFaultLine(
+            "[^6].*|6 .*(out of memory|disk I/O error|unable to open database file)|6 WATCH NOT OPEN|"
+            "6 .*FAILED\\[19\\]: constraint failed|"  // SQLite's own text of 19, its detail not allocated
+            "6 (SQLITE STEP|CONVERT TO INT|CONVERT TO DOUBLE) ERROR!!!.*");
+        for (const std::string& line : lines) {
+            EXPECT_TRUE(std::regex_match(line, kFaultLine) ||
+                        std::count(normal.lines.begin(), normal.lines.end(), line))
+                << line;
+        }
+        const std::string bytes = FileBytes(dir + "/t.db");
+        const bool alone =
+            !std::filesystem::exists(dir + "/t.db-journal") && !std::filesystem::exists(dir + "/t.db-wal");
+        const std::string now = alone && bytes == m_beforeBytes ? m_before
+            : alone && bytes == normal.bytes                    ? normal.content
+                                                                : Content(dir);
+        EXPECT_TRUE(now == m_before || now == normal.content || Whole(row, now)) << now;
+        EXPECT_TRUE(rc != normal.rc || now == normal.content) << now;
+        int fallbacks = 0;
+        // A read whose step failed gives 0 and its line: what a row noted
+        // from it may differ.
+        const bool ranThrough =
+            rc == normal.rc && (lines == normal.lines || normal.cells.empty() || normal.cells[0] != "noted");
+        EXPECT_TRUE(!ranThrough || cells.size() <= normal.cells.size());
+        for (std::size_t i = 0; ranThrough && i < cells.size() && i < normal.cells.size(); ++i) {
+            EXPECT_TRUE(cells[i] == normal.cells[i] || cells[i].empty()) << i << ": " << cells[i];
+            fallbacks += cells[i] != normal.cells[i] ? 1 : 0;
+        }
+        if (std::get<1>(GetParam())) {  // a per-call visit leaves nothing behind that the descriptors do not show
+            ExpectWriteSeen(dir, session);
+        }
+        return fallbacks;
+    }
+
+    // A file a row of many steps may leave: whole, at one of its steps.
+    static bool Whole(const Operation& row, const std::string& content)
+    {
+        return (row.flags & kSteps) != 0 && content.rfind("ok|", 0) == 0;
+    }
+
+    // Kills a process running every row in turn (each in its own directory,
+    // reporting each row once it returned) at a random moment, on a file
+    // system that loses what was not synced when power is cut: the rows
+    // reported are in their files, the one in flight is there whole or not
+    // at all, the others untouched.
+    void Crash(bool powerCut)
+    {
+        std::vector<Outcome> normal;
+        const auto start = std::chrono::steady_clock::now();
+        for (const Operation& row : kOperations) {
+            normal.push_back(Normal(row, PathOf(row.name)));
+        }
+        const auto pass =
+            std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - start);
+        std::mt19937 random(powerCut ? 3 : 4);
+        for (int round = 0; round < 6; ++round) {
+            for (const Operation& row : kOperations) {
+                Reseed(PathOf(row.name), m_seed);
+            }
+            int fds[2];
+            const pid_t pid = pipe(fds) == 0 ? fork() : -1;
+            if (pid == 0) {
+                std::optional<faultfs::Installed> fs;
+                if (powerCut) {
+                    fs.emplace();
+                }
+                for (const Operation& row : kOperations) {
+                    DASession session;
+                    DACursor cursor;
+                    Run(row, PathOf(row.name), session, cursor);
+                    if (write(fds[1], "x", 1) != 1) {
+                        _exit(1);
+                    }
+                }
+                _exit(0);
+            }
+            ASSERT_GT(pid, 0);
+            close(fds[1]);
+            usleep(std::uniform_int_distribution<useconds_t>(0, pass.count())(random));
+            kill(pid, SIGKILL);
+            waitpid(pid, nullptr, 0);
+            std::size_t done = 0;
+            for (char byte = 0; read(fds[0], &byte, 1) == 1;) {
+                ++done;
+            }
+            close(fds[0]);
+            for (std::size_t i = 0; i < normal.size(); ++i) {
+                SCOPED_TRACE(std::string(kOperations[i].name) + ", " + std::to_string(done) + " done");
+                const std::string dir = PathOf(kOperations[i].name);
+                const std::string now = Content(dir);
+                EXPECT_TRUE(i < done ? now == normal[i].content
+                                     : now == m_before ||
+                                    (i == done && (now == normal[i].content || Whole(kOperations[i], now))))
+                    << now;
+            }
+            DASession session;
+            ExpectWriteSeen(PathOf(kOperations[std::min(done, normal.size() - 1)].name), session);
+        }
+    }
+
+    std::string m_seed;
+    std::string m_before;
+    std::string m_beforeBytes;
+};
+
+}  // namespace
+
+// Allocation failure (SQLite's allocator or operator new) and an I/O error
+// (a write, truncation or sync failing), each at every point of every row
+// in turn, then the power cut; no descriptor or memory is left behind.
+TEST_P(FaultDriver, EveryRowSurvivesTheFault)
 {
     ASSERT_TRUE(g_installed);
-    const Allocator allocator = std::get<0>(GetParam());
-    const bool held = std::get<1>(GetParam());
-    RawDb(PathOf("seed.db"))
-        .Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT, n REAL); CREATE TABLE d(x);"
-             "INSERT INTO t VALUES (1, 'a', 1.5), (2, 'b', 2.5);"
-             "CREATE TABLE u(k INTEGER, w TEXT); INSERT INTO u VALUES (1, 'x'); CREATE TABLE p(x);");
-    DADatabase db;
-    DACreateRequest create;
-    DADropRequest drop;
-    DAUpdateRequest update;
-    DADeleteRequest remove;
-    DAUpsertRequest upsert;
-    DASelectRequest select;
-    DAJoinRequest join;
-    DACursor cursor;
-    bool exists = false;
-    At(create, Dir(), "c").SetColumnKey("name", "TEXT");
-    At(update, Dir(), "t").SetData("v", "z");
-    update.SetWhere("k", 1);
-    At(remove, Dir(), "t").SetWhere("k", 2);
-    At(upsert, Dir(), "t").SetData("k", 3);
-    At(select, Dir(), "t").SetWhere("v", "a");
-    join.SetPath(Dir().c_str(), "t.db");
-    join.SetLeftJoin("t", "k");
-    join.SetRightJoin("u", "k");
-    DABatchRequest batch;
-    At(batch, Dir()).Add(upsert);
-    batch.Add(remove);
-    // op(db) or op(session), the session opened (its failure is the result)
-    // and closed. However op ends, a throw included, the session then takes
-    // a write that another connection sees.
-    const auto via = [&](auto&& op) {
-        if (!held) {
-            return op(db);
+    const Kind kind = std::get<0>(GetParam());
+    if (kind == kKill || kind == kPowerCut) {
+        Crash(kind == kPowerCut);
+        return;
+    }
+    int fallbacks = 0;
+    for (const Operation& row : kOperations) {
+        if ((row.flags & kHeavy) != 0 && kind == kSqliteMalloc) {
+            continue;
         }
-        DASession session;
-        const int rc = session.Open(join);
-        if (rc != SQLITE_OK) {
-            return rc;
-        }
-        struct Probe {
-            DASession& session;
-            std::string path;
-            ~Probe()
-            {
-                const int armed = std::exchange(g_failAt, 0);
-                DAUpsertRequest row;
-                row.SetTable("p");
-                row.SetData("x", "probe");
-                EXPECT_EQ(0, session.Upsert(row));
-                EXPECT_EQ("1", RawDb(path).Query("SELECT count(*) FROM p"));
-                g_failAt = armed;
-            }
-        } const probe{session, PathOf("t.db")};
-        return op(session);
-    };
-    const std::map<std::string, std::function<int()>> ops{
-        {"CreateTable", [&] { return via([&](auto& t) { return t.CreateTable(create); }); }},
-        {"DropTable", [&] { return via([&](auto& t) { return t.DropTable(At(drop, Dir(), "d")); }); }},
-        // Fails anyway: exec's error text is then copied, which can fail too.
-        {"DropMissing", [&] { return via([&](auto& t) { return t.DropTable(At(drop, Dir(), "gone")); }); }},
-        {"Update", [&] { return via([&](auto& t) { return t.Update(update); }); }},
-        {"Delete", [&] { return via([&](auto& t) { return t.Delete(remove); }); }},
-        {"Upsert", [&] { return via([&](auto& t) { return t.Upsert(upsert); }); }},
-        {"ExecuteBatch", [&] { return via([&](auto& t) { return t.ExecuteBatch(batch); }); }},
-        {"Migrate", [&] { return via([&](auto& t) { return t.Migrate(batch, 1); }); }},
-        {"Select", [&] { return via([&](auto& t) { return t.Select(select, cursor); }); }},
-        {"JoinSelect", [&] { return via([&](auto& t) { return t.JoinSelect(join, cursor); }); }},
-        {"CheckExistTable", [&] { return via([&](auto& t) { return CheckExist(t, join, "u", exists) + !exists; }); }},
-        {"Fill", [&] {  // a request and the cursor filled, the cursor read: 0 when all reads back
-             int k = 0;
-             double n = 0;
-             upsert.SetWhere("n", 2.5), cursor.Initialize(), cursor.SetColumn("k"), cursor.SetData("k", "7");
-             return cursor.MoveToNext() + cursor.GetInt("k", k) + cursor.GetDouble("k", n) + (k * n == 49 ? 0 : 1);
-         }}};
-    // The file as a fresh connection sees it, the seed copied there first if asked.
-    const auto state = [&](bool reseed) {
-        const auto overwrite = std::filesystem::copy_options::overwrite_existing;
-        if (reseed) {  // a log a failed close left behind goes too
-            std::filesystem::remove(PathOf("t.db-wal"));
-            std::filesystem::copy_file(PathOf("seed.db"), PathOf("t.db"), overwrite);
-        }
-        RawDb raw(PathOf("t.db"));
-        return raw.Query("SELECT name FROM sqlite_master") + "/" + raw.Query("SELECT * FROM t");
-    };
-    dlog_set_sink(&Sink, nullptr);
-    for (const auto& [op, run] : ops) {
-        const bool query = std::strstr("Select JoinSelect CheckExistTable", op.c_str()) != nullptr;
-        const std::string before = state(true);
-        const int expected = run();
-        const Strings normal = std::exchange(g_lines, {});
-        ASSERT_EQ(op == "DropMissing" ? 1 : 0, expected);
-        const std::string after = state(false);
-        const Strings rows = Dump(cursor);
-        int fallbacks = 0;
-        const std::regex kAllowed("[^6].*|.*out of memory|6 (SQLITE STEP|CONVERT TO INT|CONVERT TO DOUBLE) ERROR!!!");
-        for (int n = 1; g_calls >= n - 1; ++n) {
-            SCOPED_TRACE(op + ", allocation " + std::to_string(n));
-            state(true);
+        const std::string dir = PathOf(row.name);
+        const Outcome normal = Normal(row, dir);
+        bool reached = true;
+        for (int n = 1; reached; ++n) {
+            SCOPED_TRACE(std::string(row.name) + ", fault " + std::to_string(n));
+            Reseed(dir, m_seed);
             const int descriptors = OpenDescriptorCount();
             const sqlite3_int64 memory = sqlite3_memory_used();
+            DASession session;
+            DACursor cursor;
             int rc = -1;  // std::bad_alloc
-            std::tie(g_lines, g_calls, g_armed, g_failAt) = std::make_tuple(Strings(), 0, allocator, n);
-            try {
-                rc = run();
-            } catch (const std::bad_alloc&) {
+            if (kind == kIoError) {
+                std::string seen;
+                {
+                    const faultfs::Installed fs;
+                    faultfs::g_state.failAt = n;
+                    rc = Run(row, dir, session, cursor);
+                    reached = faultfs::g_state.calls >= n;
+                    faultfs::g_state.failAt = 0;
+                    const Strings lines = std::exchange(g_lines, {});
+                    fallbacks += Check(row, normal, rc, lines, Cells(cursor), dir, session);
+                    seen = Content(dir);
+                }
+                EXPECT_EQ(seen, Content(dir)) << "after a power cut";
+            } else {
+                std::tie(g_lines, g_calls, g_armed, g_failAt) =
+                    std::make_tuple(Strings(), 0, kind == kSqliteMalloc ? kSqlite : kNew, n);
+                try {
+                    rc = Run(row, dir, session, cursor);
+                } catch (const std::bad_alloc&) {
+                }
+                g_failAt = 0;
+                reached = g_calls >= n;
+                const Strings lines = std::exchange(g_lines, {});
+                fallbacks += Check(row, normal, rc, lines, Cells(cursor), dir, session);
             }
-            g_failAt = 0;
             EXPECT_EQ(descriptors, OpenDescriptorCount());
             EXPECT_EQ(memory, sqlite3_memory_used());
-            const std::string now = state(false);
-            EXPECT_TRUE(now == before || now == after) << now;
-            // SQLite's text of a failed allocation (also where sqlite3_errstr
-            // stands in for a missing exec text); a stream's extraction swallows
-            // a failed allocation and fails the read.
-            int errors = 0;
-            for (const std::string& line : g_lines) {
-                EXPECT_TRUE(std::regex_match(line, kAllowed) || std::count(normal.begin(), normal.end(), line) > 0)
-                    << line;
-                errors += line[0] == '6' ? 1 : 0;
-            }
-            if (g_calls < n || (rc == 0 && !query)) {
-                EXPECT_EQ(expected, rc);  // ran through, or SQLite tolerated the failure
-                EXPECT_EQ(after, now);
-            } else if (rc != -1) {
-                // A failed step is reported by its line alone, and the rows read
-                // before it stay; a column text SQLite could not give is stored as
-                // "". (A missing column name is not reachable: SQLite's names
-                // need no allocation once the statement runs.)
-                EXPECT_TRUE(rc == 0 ? query : errors > 0) << rc;
-                const Strings got = Dump(cursor);
-                for (std::size_t i = 0; rc == 0 && i < got.size(); ++i) {
-                    EXPECT_TRUE(i < rows.size() && (got[i] == rows[i] || got[i].empty())) << i << ": " << got[i];
-                    fallbacks += i < rows.size() && got[i] != rows[i] ? 1 : 0;
-                }
-            }
-            state(true);
-            EXPECT_EQ(expected, run());  // at once: no member lock is left held
-            EXPECT_EQ(rows, Dump(cursor));
         }
-        EXPECT_TRUE(fallbacks > 0 || allocator == kNew || !query || op == "CheckExistTable") << op;
     }
-    dlog_set_sink(nullptr, nullptr);
+    EXPECT_TRUE(fallbacks > 0 || kind != kSqliteMalloc);
 }
 
-INSTANTIATE_TEST_SUITE_P(Every, AllocFailure, ::testing::Combine(::testing::Values(kSqlite, kNew), ::testing::Bool()),
+INSTANTIATE_TEST_SUITE_P(Every, FaultDriver,
+                         ::testing::Combine(::testing::Values(kSqliteMalloc, kOperatorNew, kIoError, kKill, kPowerCut),
+                                            ::testing::Bool()),
                          [](const auto& info) {
-                             return std::string(std::get<0>(info.param) == kSqlite ? "sqlite_malloc" : "operator_new") +
+                             return std::string(kKindNames[std::get<0>(info.param)]) +
                                  (std::get<1>(info.param) ? "_session" : "_per_call");
                          });
+
+namespace {
 
 struct IoCase {
     const char* name;
@@ -443,173 +545,6 @@ TEST_F(Faults, PowerCutDuringBackupsLeavesAWholeBackup)
     EXPECT_TRUE(FileExists("copy.db"));
 }
 
-TEST_F(Faults, KilledWriterLosesNoAcknowledgedRow)
-{
-    RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT)");
-    std::mt19937 random(20261123);
-    std::string acknowledged = "-1";  // the rows whose Upsert returned 0
-    int count = 0;
-    for (int round = 0; round < 6; ++round) {
-        int fds[2];
-        const pid_t pid = pipe(fds) == 0 ? fork() : -1;
-        if (pid == 0) {  // the writer, until killed: reports each row whose Upsert returned 0
-            dlog_set_sink(&dlog_discard_sink, nullptr);
-            for (int k = round * 1000000;; ++k) {
-                DAUpsertRequest request;
-                At(request, Dir(), "t").SetData("k", k);
-                request.SetData("v", std::string(k % 900, 'v').c_str());
-                if (DADatabase().Upsert(request) == 0 && write(fds[1], &k, sizeof k) != sizeof k) {
-                    _exit(1);
-                }
-            }
-        }
-        ASSERT_GT(pid, 0);
-        close(fds[1]);
-        usleep(std::uniform_int_distribution<useconds_t>(20000, 150000)(random));
-        kill(pid, SIGKILL);
-        waitpid(pid, nullptr, 0);
-        for (int k = 0; read(fds[0], &k, sizeof k) == sizeof k; ++count) {
-            acknowledged += "," + std::to_string(k);
-        }
-        close(fds[0]);
-        RawDb db(PathOf("t.db"));
-        EXPECT_EQ("ok", db.Query("PRAGMA integrity_check"));
-        EXPECT_EQ(std::to_string(count), db.Query("SELECT count(*) FROM t WHERE k IN (" + acknowledged + ")"));
-    }
-    EXPECT_GT(count, 6) << "the writer must have got some rows in";
-}
-
-// A session writing rows 0, 1, 2, ... in a process killed at a random
-// moment, on a file system that loses every write not yet synced (a power
-// cut). The file is whole and holds a prefix of the rows; with the default
-// sync every acknowledged row, without it maybe fewer, never a gap.
-class PowerCut : public TempDirTest, public ::testing::WithParamInterface<bool> {};
-
-TEST_P(PowerCut, LeavesAWholeFileWithAPrefixOfTheRows)
-{
-    const bool sync = GetParam();
-    RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT)");
-    std::mt19937 random(sync ? 11 : 12);
-    int next = 0;  // rows 0..next-1 are in the file
-    for (int round = 0; round < 6; ++round) {
-        int fds[2];
-        const pid_t pid = pipe(fds) == 0 ? fork() : -1;
-        if (pid == 0) {
-            const faultfs::Installed fs;
-            dlog_set_sink(&dlog_discard_sink, nullptr);
-            DASession session;
-            session.SetSyncOnCommit(sync);
-            // Never reached; unsynced, the log reaches the file at
-            // checkpoints, here every 64 pages, so that some rows survive.
-            session.SetSizeLimit(2 << 20);
-            DABasePath location;
-            if (session.Open(At(location, Dir())) != 0) {
-                _exit(2);
-            }
-            for (int k = next;; ++k) {  // until killed
-                DAUpsertRequest request;
-                At(request, Dir(), "t").SetData("k", k);
-                request.SetData("v", std::string(k % 30, 'v').c_str());
-                if (session.Upsert(request) == 0 && write(fds[1], &k, sizeof k) != sizeof k) {
-                    _exit(1);
-                }
-            }
-        }
-        ASSERT_GT(pid, 0);
-        close(fds[1]);
-        usleep(std::uniform_int_distribution<useconds_t>(50000, sync ? 200000 : 400000)(random));
-        kill(pid, SIGKILL);
-        waitpid(pid, nullptr, 0);
-        int last = next - 1;  // the last acknowledged row
-        for (int k = 0; read(fds[0], &k, sizeof k) == sizeof k;) {
-            last = k;
-        }
-        close(fds[0]);
-        RawDb db(PathOf("t.db"));
-        EXPECT_EQ("ok", db.Query("PRAGMA integrity_check"));
-        const int rows = std::stoi(db.Query("SELECT count(*) FROM t"));
-        EXPECT_EQ(std::to_string(rows - 1), db.Query("SELECT coalesce(max(k), -1) FROM t"));  // no gap
-        EXPECT_LE(rows, last + 2);  // at most the one in flight beyond the acknowledged
-        if (sync) {
-            EXPECT_GE(rows, last + 1);  // nothing acknowledged is lost
-        }
-        EXPECT_GE(rows, next);
-        next = rows;
-    }
-    EXPECT_GT(next, sync ? 6 : 0) << "some rows must have survived";
-}
-
-INSTANTIATE_TEST_SUITE_P(Sessions, PowerCut, ::testing::Bool(),
-                         [](const auto& info) { return std::string(info.param ? "synced" : "not_synced"); });
-
-// An I/O error at each write and each sync, in turn, of a session's life:
-// the failing operation returns its code, the session goes on, Close works;
-// what was acknowledged is there (also after a power cut), a batch lands
-// whole or not at all, the file is whole.
-TEST_F(Faults, SessionSurvivesAnIoErrorAtEveryWriteAndSync)
-{
-    RawDb(PathOf("seed.db"))
-        .Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); INSERT INTO t VALUES (1, 'a'), (2, 'b')");
-    // Each operation's effect, as a query that gives "1" once it is there.
-    const char* const effects[] = {"SELECT count(*) FROM t WHERE k = 100", "SELECT count(*) = 2 FROM t WHERE k > 100",
-                                   "SELECT count(*) = 0 FROM t WHERE k = 1", "SELECT v = 'z' FROM t WHERE k = 2"};
-    const auto check = [&](const int(&rc)[4]) {
-        RawDb db(PathOf("t.db"));
-        EXPECT_EQ("ok", db.Query("PRAGMA integrity_check"));
-        EXPECT_NE("1", db.Query("SELECT count(*) = 1 FROM t WHERE k > 100"));  // the batch is whole
-        for (int i = 0; i < 4; ++i) {
-            EXPECT_TRUE(rc[i] != 0 || db.Query(effects[i]) == "1") << i;
-        }
-    };
-    bool reached = true;
-    int n = 1;
-    for (; reached; ++n) {
-        SCOPED_TRACE("fault " + std::to_string(n));
-        std::filesystem::copy_file(PathOf("seed.db"), PathOf("t.db"),
-                                   std::filesystem::copy_options::overwrite_existing);
-        int rc[4] = {-1, -1, -1, -1};
-        {
-            const faultfs::Installed fs;
-            faultfs::g_state.failAt = n;
-            const LogCapture log;
-            DASession session;
-            DABasePath location;
-            const int opened = session.Open(At(location, Dir()));
-            // Open succeeds only with the log in effect.
-            EXPECT_EQ(opened == 0 ? "wal" : "delete", RawDb(PathOf("t.db")).Query("PRAGMA journal_mode")) << opened;
-            DAUpsertRequest upserts[3];
-            DABatchRequest batch;
-            DADeleteRequest remove;
-            DAUpdateRequest update;
-            for (int i = 0; i < 3; ++i) {
-                At(upserts[i], Dir(), "t").SetData("k", 100 + i);
-            }
-            At(remove, Dir(), "t").SetWhere("k", 1);
-            At(update, Dir(), "t").SetData("v", "z");
-            update.SetWhere("k", 2);
-            At(batch, Dir()).Add(upserts[1]);
-            batch.Add(upserts[2]);
-            rc[0] = session.Upsert(upserts[0]);
-            rc[1] = session.ExecuteBatch(batch);
-            rc[2] = session.Delete(remove);
-            rc[3] = session.Update(update);
-            session.Close();
-            reached = faultfs::g_state.calls >= n;
-            int failures = 0;
-            for (const int code : rc) {
-                EXPECT_TRUE(code == 0 || code == SQLITE_IOERR || (opened != 0 && code == SQLITE_MISUSE)) << code;
-                failures += code != 0 ? 1 : 0;
-            }
-            // The session goes on after the failed operation; one line each.
-            EXPECT_LE(failures, opened == 0 ? 1 : 4);
-            EXPECT_EQ(opened == 0 ? 4 : 5, static_cast<int>(log.Lines().size()));
-            check(rc);  // as this process sees the files
-        }
-        check(rc);  // after a power cut
-    }
-    EXPECT_GT(n, 20) << "writes and syncs of the open, four operations and the close";
-}
-
 // The killed migration's pipe: its first busy warning (the commit waiting
 // for a reader) is written there.
 int g_busyPipe = -1;
@@ -662,30 +597,6 @@ TEST_F(Faults, KilledMigrationLeavesTheOldVersion)
     EXPECT_EQ("1|200", reader.Query("SELECT (SELECT user_version FROM pragma_user_version), count(*) FROM t"));
 }
 
-// A leaf page in the middle overwritten: Query returns the step's own code
-// with its line, keeping the rows read before; Select keeps its rule (the
-// step failure is logged, not returned).
-TEST_F(Faults, QueryOverADamagedPageReturnsTheStepFailure)
-{
-    RawDb(PathOf("t.db"))
-        .Run("PRAGMA page_size = 4096; CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); WITH RECURSIVE "
-             "n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 200) INSERT INTO t "
-             "SELECT i, printf('%0200d', i) FROM n;");
-    std::fstream(PathOf("t.db"), std::ios::in | std::ios::out | std::ios::binary).seekp(4 * 4096)
-        << std::string(4096, '\x7f');
-    DAQueryRequest query;
-    DASelectRequest select;
-    DACursor cursor;
-    LogCapture log;
-    EXPECT_EQ(11, DADatabase().Query(At(query, Dir(), "t"), cursor));
-    EXPECT_TRUE(cursor.GetCount() > 0 && cursor.GetCount() < 200) << cursor.GetCount();
-    EXPECT_EQ(0, DADatabase().Select(At(select, Dir(), "t"), cursor));
-    EXPECT_EQ((Strings{"6 DADatabasePasrser.cpp:ParseDatabase > SQLITE STEP ERROR!!! SQL logic error",
-                       "6 DADatabase.cpp:Query > QUERY FAILED[11]: database disk image is malformed",
-                       "6 DADatabasePasrser.cpp:ParseDatabase > SQLITE STEP ERROR!!! SQL logic error"}),
-              Described(log));
-}
-
 // Quotes, format and comment characters, separators, UTF-8, control bytes
 // (no NUL), SQL; sometimes empty, sometimes long.
 std::string RandomText(std::mt19937& random)
@@ -701,12 +612,18 @@ std::string RandomText(std::mt19937& random)
     return text;
 }
 
+// Through both sources: per call, and a session (its statements kept by
+// shape, the texts bound).
 TEST_F(Faults, RandomTextsRoundTripAsValuesAndConditions)
 {
     std::mt19937 random(1);
     RawDb(PathOf("t.db")).Run("CREATE TABLE t(k TEXT PRIMARY KEY, v TEXT)");
     DADatabase db;
+    DASession session;
+    DABasePath at;
+    ASSERT_EQ(0, session.Open(At(at, Dir())));
     for (int i = 0; i < 60; ++i) {
+        Target t{&db, i % 2 == 0 ? nullptr : &session};
         const std::string key = RandomText(random);
         const std::string first = RandomText(random);
         const std::string second = RandomText(random);
@@ -716,33 +633,35 @@ TEST_F(Faults, RandomTextsRoundTripAsValuesAndConditions)
             DACursor cursor;
             At(select, Dir(), "t").SetWhere("k", key.c_str());
             select.SetWhere(value.empty() ? "k" : "v", value.c_str());  // k again: dropped
-            EXPECT_EQ(0, db.Select(select, cursor));
+            EXPECT_EQ(0, RUN(t, Select, select, cursor));
             return Dump(cursor);
         };
         DAUpsertRequest upsert;
         At(upsert, Dir(), "t").SetData("k", key.c_str());
         upsert.SetData("v", first.c_str());
-        ASSERT_EQ(0, db.Upsert(upsert));
+        ASSERT_EQ(0, RUN(t, Upsert, upsert));
         EXPECT_EQ((Strings{"k", "v", key, first}), find(first));
         DAUpdateRequest update;
         At(update, Dir(), "t").SetData("v", second.c_str());
         update.SetWhere("k", key.c_str());
         update.SetWhere("v", first.c_str());
-        ASSERT_EQ(0, db.Update(update));
+        ASSERT_EQ(0, RUN(t, Update, update));
         EXPECT_EQ((Strings{"k", "v", key, second}), find(second));
         DADeleteRequest remove;
         At(remove, Dir(), "t").SetWhere("k", key.c_str());
         remove.SetWhere("v", second.c_str());
-        ASSERT_EQ(0, db.Delete(remove));
+        ASSERT_EQ(0, RUN(t, Delete, remove));
         EXPECT_EQ(Strings(), find(""));
     }
 }
 
+// Random moves and reads of cursors of -1 (no column) to 4 rows against a
+// model of them: each code, position and failure line.
 TEST(CursorModel, RandomMovesAgreeWithIt)
 {
     std::mt19937 random(2);
     const LogCapture log;
-    std::size_t failures = 0;
+    Strings expected;  // the line of each failure
     for (int round = 0; round < 100; ++round) {
         const auto draw = [&](int low, int high) { return std::uniform_int_distribution<int>(low, high)(random); };
         const int count = draw(-1, 4);  // -1: no column
@@ -761,19 +680,35 @@ TEST(CursorModel, RandomMovesAgreeWithIt)
              [&] { return row >= 0 && row < count ? (position = row, 0) : 1; }},
             {[&] { return cursor.MoveToFirst(), 0; }, [&] { return position = -1, 0; }},
             {[&] { return cursor.MoveToLast(), 0; }, [&] { return position = count, 0; }},
-            {[&] { return cursor.GetString("b", value = "-"); },
-             [&] { return position >= 0 && position < count && value == std::to_string(position) ? 0 : 1; }},
+            {[&] { return cursor.GetString("b", value = "-"); },  // a failed read leaves the output alone
+             [&] {
+                 return position >= 0 && position < count ? (value == std::to_string(position) ? 0 : 9)
+                                                          : (value == "-" ? 1 : 9);
+             }},
         };
+        const std::string lines[] = {"4 DACursor.cpp:MoveToNext > Last Row",
+                                     "4 DACursor.cpp:MoveToPrev > First Row",
+                                     "6 DACursor.cpp:MoveToPosition > Invalid Position",
+                                     "",
+                                     "",
+                                     count < 0 ? "6 DACursor.cpp:GetString > NO MATCHED ERROR!!!"
+                                               : "6 DACursor.cpp:GetString > CURSOR RANGE ERROR!!!"};
         for (int step = 0; step < 60; ++step) {
             const int move = draw(0, 5);
             row = draw(-2, 5);
             const int got = moves[move].first();
             ASSERT_EQ(moves[move].second(), got) << "round " << round << " step " << step << " move " << move;
             ASSERT_EQ(position, cursor.GetPosition()) << "round " << round << " step " << step;
-            failures += got != 0 ? 1 : 0;
+            if (got != 0) {
+                expected.push_back(lines[move]);
+            }
         }
+        cursor.Initialize();  // as if new
+        Strings names;
+        EXPECT_EQ((std::vector<int>{-1, -1, 1}),
+                  (std::vector<int>{cursor.GetCount(), cursor.GetPosition(), cursor.GetColumn(names)}));
     }
-    EXPECT_EQ(failures, log.Lines().size());
+    EXPECT_EQ(expected, Described(log));
 }
 
 }  // namespace

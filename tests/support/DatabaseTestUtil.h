@@ -8,6 +8,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -39,7 +40,9 @@ Location& At(Location& location, const std::string& dir)
 // The bytes of a file, to see that it is unchanged.
 inline std::string FileBytes(const std::string& path)
 {
-    return {std::istreambuf_iterator<char>(std::ifstream(path, std::ios::binary).rdbuf()), {}};
+    std::ostringstream bytes;
+    bytes << std::ifstream(path, std::ios::binary).rdbuf();
+    return bytes.str();
 }
 
 // One log line as Described shows it: "priority file:function > message".

@@ -347,6 +347,7 @@ int DAWatch::Open(DABasePath& location)
         DA_LOG(DLOG_ERROR, "DB open failed. Error no(%d): %s", rc, db ? sqlite3_errmsg(db.get()) : sqlite3_errstr(rc));
         return rc;
     }
+    const std::string wal = state.path + "-wal";  // made first: nothing may throw once fd is open
     const int fd = inotify_init1(IN_NONBLOCK | IN_CLOEXEC);
     const int folderWatch = fd < 0 ? -1 : inotify_add_watch(fd, state.folder.c_str(), kFolderEvents);
     if (folderWatch < 0 || inotify_add_watch(fd, state.path.c_str(), kFileEvents) < 0) {
@@ -356,7 +357,7 @@ int DAWatch::Open(DABasePath& location)
         }
         return SQLITE_CANTOPEN;
     }
-    inotify_add_watch(fd, (state.path + "-wal").c_str(), kFileEvents);  // if there is one now
+    inotify_add_watch(fd, wal.c_str(), kFileEvents);  // if there is one now
     state.db = std::move(db);
     state.fd = fd;
     state.folderWatch = folderWatch;

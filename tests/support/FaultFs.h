@@ -4,9 +4,11 @@
 // A file system for SQLite that behaves like a disk behind a volatile cache:
 // writes and truncations are held in memory, per file, until the file is
 // synced; reads see them. A process killed before a sync loses them, as a
-// power cut would. It can also fail the n-th write or sync with an I/O
-// error. It wraps SQLite's "unix" file system; shared memory and locks are
-// the real ones. Deletions are not held back.
+// power cut would. It can also fail the n-th write, truncation or sync
+// with an I/O error, and it counts the database files opened and the
+// shared-memory lock calls (one read transaction takes and drops one). It
+// wraps SQLite's "unix" file system; shared memory and locks are the real
+// ones. Deletions are not held back.
 
 #include <algorithm>
 #include <cstdint>
@@ -31,8 +33,10 @@ struct Op {
 struct State {
     std::mutex mutex;
     std::map<std::string, std::vector<Op>> pending;  // by path, unsynced, in order
-    int failAt = 0;  // the write or sync to fail, counted from 1; 0: none
+    int failAt = 0;  // the write, truncation or sync to fail, counted from 1; 0: none
     int calls = 0;
+    int opened = 0;  // main database files
+    int shmLocks = 0;
 };
 inline State g_state;
 
@@ -102,8 +106,8 @@ inline int Read(sqlite3_file* handle, void* buffer, int amount, sqlite3_int64 of
 inline int Hold(sqlite3_file* handle, Op op)
 {
     const std::lock_guard<std::mutex> guard(g_state.mutex);
-    if (!op.truncate && FailNow()) {
-        return SQLITE_IOERR_WRITE;
+    if (FailNow()) {
+        return op.truncate ? SQLITE_IOERR_TRUNCATE : SQLITE_IOERR_WRITE;
     }
     g_state.pending[*reinterpret_cast<File*>(handle)->key].push_back(std::move(op));
     return SQLITE_OK;
@@ -159,6 +163,7 @@ inline const sqlite3_io_methods kMethods = {
         return Real(f)->pMethods->xShmMap(Real(f), page, size, extend, out);
     },
     [](sqlite3_file* f, int offset, int n, int flags) {
+        ++g_state.shmLocks;
         return Real(f)->pMethods->xShmLock(Real(f), offset, n, flags);
     },
     [](sqlite3_file* f) { Real(f)->pMethods->xShmBarrier(Real(f)); },
@@ -180,6 +185,7 @@ public:
             auto* file = reinterpret_cast<File*>(handle);
             file->real = reinterpret_cast<sqlite3_file*>(file + 1);
             const int rc = Unix()->xOpen(Unix(), name, file->real, flags, out);
+            g_state.opened += (flags & SQLITE_OPEN_MAIN_DB) != 0 ? 1 : 0;
             file->base.pMethods = rc == SQLITE_OK ? &kMethods : nullptr;
             file->key = rc == SQLITE_OK
                 ? new std::string(name != nullptr ? name : "#" + std::to_string(reinterpret_cast<std::uintptr_t>(file)))
@@ -198,7 +204,7 @@ public:
         sqlite3_vfs_register(Unix(), 1);
         sqlite3_vfs_unregister(&m_vfs);
         g_state.pending.clear();
-        g_state.failAt = g_state.calls = 0;
+        g_state.failAt = g_state.calls = g_state.opened = g_state.shmLocks = 0;
     }
     Installed(const Installed&) = delete;
     Installed& operator=(const Installed&) = delete;
