@@ -323,7 +323,8 @@ inline const Operation kOperations[] = {
          DASearchIndexRequest index;
          At(index, dir, "groups").SetName("titles");
          index.AddColumn("title");
-         int rc = RUN(t, CreateSearchIndex, index) * 10 + RUN(t, CreateSearchIndex, index);
+         // Unsigned: under a fault the codes are larger and the digits wrap.
+         unsigned rc = RUN(t, CreateSearchIndex, index) * 10U + RUN(t, CreateSearchIndex, index);
          index.SetName("other");
          index.AddColumn("nope");
          rc = rc * 10 + RUN(t, CreateSearchIndex, index);
@@ -341,7 +342,7 @@ inline const Operation kOperations[] = {
              rc =
                  rc * 100 + (t.session != nullptr ? t.session->DropSearchIndex(name) : t.db->DropSearchIndex(at, name));
          }
-         return rc;
+         return static_cast<int>(rc);
      },
      kSteps | kHeavy,
      "11012100 / / ok|0/contacts;contacts_by_name/1|Kim|010;2|Lee|011;3|Park|012/\n"
