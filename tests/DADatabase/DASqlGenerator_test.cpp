@@ -252,6 +252,14 @@ const SqlCase kCases[] = {
     {kUpsert, "t", {{kName, "Kim"}}, {}, "INSERT OR REPLACE INTO t (name) VALUES ('Kim')", TsBefore},  // ignored
     {kQuery, "events", {}, {}, "SELECT * FROM events WHERE ts<1700000000000 ORDER BY ts DESC LIMIT 50",
      [](DABaseSet& r) { TsBefore(r), Q(r).SetOrderBy("ts", true), Q(r).SetLimit(50); }},
+    // Pages: a negative offset counts as 0, a negative count as no limit; sort keys are copied.
+    {kQuery, "t", {}, {}, "SELECT * FROM t ORDER BY phone DESC, name, _ID DESC LIMIT 0 OFFSET 1", [](DABaseSet& r) {
+        Q(r).SetOrderBy("phone", true), Q(r).SetOrderBy(std::string("name").c_str()), Q(r).SetOrderBy("_ID", true);
+        Q(r).SetLimit(0, 1); }},
+    {kQuery, "t", {}, {}, "SELECT * FROM t LIMIT 0", [](DABaseSet& r) { Q(r).SetLimit(0); }},
+    {kQuery, "t", {}, {}, "SELECT * FROM t LIMIT 10", [](DABaseSet& r) { Q(r).SetLimit(10, -3); }},
+    {kQuery, "t", {}, {}, "SELECT * FROM t LIMIT -1 OFFSET 20", [](DABaseSet& r) { Q(r).SetLimit(-5, 20); }},
+    {kQuery, "t", {}, {}, "SELECT * FROM t", [](DABaseSet& r) { Q(r).SetLimit(-5); }},
     {kQuery, "events", {}, {}, "SELECT type, COUNT(*) AS n, MAX(ts) AS newest FROM events WHERE ts>=5 "
      "GROUP BY type ORDER BY n DESC LIMIT 5", [](DABaseSet& r) {
         Q(r).AddColumn("type"), Q(r).AddAggregate(DAAggregate::Count, nullptr, "n");

@@ -470,41 +470,6 @@ INSTANTIATE_TEST_SUITE_P(Every, IoFaults, ::testing::ValuesIn(kIoCases),
 
 using Faults = TempDirTest;
 
-// A session on a disk that fills up: each write fails with 13 and one line
-// (a delete too: its log needs room, which only a size budget keeps), Close
-// works, and once there is room again the file holds every acknowledged row.
-TEST_F(Faults, SessionOnAFullDiskFailsCleanlyAndKeepsTheFile)
-{
-    RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT)");
-    DASession session;
-    DABasePath location;
-    ASSERT_EQ(0, session.Open(At(location, Dir())));
-    const auto upsert = [&](int k) {
-        DAUpsertRequest request;
-        At(request, Dir(), "t").SetData("k", k);
-        request.SetData("v", std::string(500, 'v').c_str());
-        return session.Upsert(request);
-    };
-    dlog_set_sink(&dlog_discard_sink, nullptr);
-    for (int k = 0; k < 20; ++k) {
-        ASSERT_EQ(0, upsert(k));
-    }
-    sqlite3_vfs* vfs = sqlite3_vfs_find(nullptr);
-    g_pwrite64 = vfs->xGetSystemCall(vfs, "pwrite64");
-    vfs->xSetSystemCall(vfs, "pwrite64", reinterpret_cast<sqlite3_syscall_ptr>(&FullDiskPwrite64));
-    LogCapture log;
-    DADeleteRequest remove;
-    At(remove, Dir(), "t").SetWhere("k", DACompare::Less, 10);
-    EXPECT_EQ(13, upsert(20));
-    EXPECT_EQ(13, session.Delete(remove));
-    session.Close();
-    vfs->xSetSystemCall(vfs, "pwrite64", g_pwrite64);
-    EXPECT_EQ((Strings{Logged(6, "DASession.cpp", "Upsert", "Upsert FAILED[13]: database or disk is full"),
-                       Logged(6, "DASession.cpp", "Delete", "delete FAILED[13]: database or disk is full")}),
-              Described(log));
-    EXPECT_EQ("20|ok", RawDb(PathOf("t.db")).Query("SELECT count(*), (SELECT * FROM pragma_integrity_check) FROM t"));
-}
-
 // Backups of a changing file in a process killed at random moments, on a
 // file system that loses what was not synced: the backup is always a whole
 // file holding one committed state.
@@ -543,58 +508,6 @@ TEST_F(Faults, PowerCutDuringBackupsLeavesAWholeBackup)
         }
     }
     EXPECT_TRUE(FileExists("copy.db"));
-}
-
-// The killed migration's pipe: its first busy warning (the commit waiting
-// for a reader) is written there.
-int g_busyPipe = -1;
-void ReportBusy(int /*logId*/, int /*prio*/, const char* /*tag*/, const char* text, void* /*user*/)
-{
-    if (std::strstr(text, "SQLITE BUSY[1]") != nullptr && write(g_busyPipe, "b", 1) != 1) {
-        _exit(1);
-    }
-}
-
-// Killed while it commits (another connection still reads, so the commit
-// waits): the file stays at the old version with none of the step's rows,
-// and the next Migrate runs the step once.
-TEST_F(Faults, KilledMigrationLeavesTheOldVersion)
-{
-    RawDb(PathOf("t.db")).Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT)");
-    DABatchRequest step;
-    At(step, Dir());
-    for (int k = 0; k < 200; ++k) {
-        DAUpsertRequest row;
-        At(row, Dir(), "t").SetData("k", k);
-        row.SetData("v", std::string(1000, 'v').c_str());
-        step.Add(row);
-    }
-    int fds[2];
-    ASSERT_EQ(0, pipe(fds));
-    RawDb reader(PathOf("t.db"));
-    reader.Run("BEGIN; SELECT count(*) FROM t;");
-    const pid_t pid = fork();
-    if (pid == 0) {
-        g_busyPipe = fds[1];
-        dlog_set_sink(&ReportBusy, nullptr);
-        _exit(DADatabase().Migrate(step, 1));
-    }
-    ASSERT_GT(pid, 0);
-    char byte = 0;
-    EXPECT_EQ(1, read(fds[0], &byte, 1));
-    kill(pid, SIGKILL);
-    EXPECT_EQ(pid, waitpid(pid, nullptr, 0));
-    close(fds[0]);
-    close(fds[1]);
-    EXPECT_TRUE(FileExists("t.db-journal"));  // the step was written, not committed
-    reader.Run("COMMIT");
-    EXPECT_EQ("0|0|ok",
-              reader.Query("SELECT (SELECT user_version FROM pragma_user_version), count(*), "
-                           "(SELECT integrity_check FROM pragma_integrity_check) FROM t"));
-    dlog_set_sink(&dlog_discard_sink, nullptr);
-    EXPECT_EQ(0, DADatabase().Migrate(step, 1));
-    dlog_set_sink(nullptr, nullptr);
-    EXPECT_EQ("1|200", reader.Query("SELECT (SELECT user_version FROM pragma_user_version), count(*) FROM t"));
 }
 
 // Quotes, format and comment characters, separators, UTF-8, control bytes

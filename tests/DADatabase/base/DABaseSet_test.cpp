@@ -73,10 +73,6 @@ TEST(DABaseSet, NullValueThrowsAndReleasesTheLock)
     EXPECT_EQ(MapsOf(set), std::make_pair(DAValueMap{{kName, "Kim"}}, DAValueMap{{kName, "Lee"}}));
 }
 
-}  // namespace
-
-namespace {
-
 // Names that could carry SQL, a null text, NaN and infinities are refused
 // with one line each and store nothing; quotes, "%n" and 10 MB values are
 // kept as given; names are copied at the call.
@@ -113,10 +109,6 @@ TEST(DABaseSet, ListedConditionsRefuseWhatIsNotPlainAndCopyNames)
     EXPECT_EQ(big, listed[1].values.at(0));
     EXPECT_EQ(expected, Described(log));
 }
-
-}  // namespace
-
-namespace {
 
 // Typed values refuse what listed conditions refuse, and a null blob with a
 // size, with one line each; a blob's bytes are copied at the call.
