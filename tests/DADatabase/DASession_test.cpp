@@ -49,6 +49,11 @@ std::vector<Operation> Rows()
     return rows;
 }
 
+std::string Line(int priority, const char* function, const std::string& message)
+{
+    return Logged(priority, "DASession.cpp", function, message);
+}
+
 class SessionTest : public TempDirTest {
 protected:
     // A fresh directory under Dir() with the seeded t.db.
@@ -119,10 +124,8 @@ TEST_F(SessionTest, RefusesWithOneLine)
     DASession session;
     DAUpsertRequest upsert;
     DACursor cursor;
-    bool exists = false;
     LogCapture log;
     EXPECT_EQ(21, session.Upsert(At(upsert, dir, "contacts")));
-    EXPECT_EQ(21, session.CheckExistTable("contacts", exists));
     EXPECT_EQ(14, OpenAt(session, PathOf("missing")));
     EXPECT_FALSE(FileExists("missing"));
     session.SetCreate(false);  // a file that does not exist is not made
@@ -145,18 +148,15 @@ TEST_F(SessionTest, RefusesWithOneLine)
     batch.SetPath(dir.c_str(), "other.db");
     batch.Add(unlocated);
     EXPECT_EQ(21, session.ExecuteBatch(batch));
-    const auto line = [](int priority, const char* function, const std::string& message) {
-        return Logged(priority, "DASession.cpp", function, message);
-    };
     EXPECT_EQ(
-        (Strings{line(6, "Upsert", "SESSION NOT OPEN"), line(6, "CheckExistTable", "SESSION NOT OPEN"),
-                 line(6, "Open", "DB open failed. Error no(14): unable to open database file"),
-                 line(6, "Open", "DB open failed. Error no(14): unable to open database file"),
-                 line(6, "Open", "DB open failed. Error no(26): file is not a database"),
-                 line(6, "Select",
+        (Strings{Line(6, "Upsert", "SESSION NOT OPEN"),
+                 Line(6, "Open", "DB open failed. Error no(14): unable to open database file"),
+                 Line(6, "Open", "DB open failed. Error no(14): unable to open database file"),
+                 Line(6, "Open", "DB open failed. Error no(26): file is not a database"),
+                 Line(6, "Select",
                       "Select FAILED[21]: request location " + Dir() + "/t.db is not the session's " + dir + "/t.db"),
-                 line(4, "Select", "OpenDB Error: 21"),
-                 line(6, "ExecuteBatch",
+                 Line(4, "Select", "OpenDB Error: 21"),
+                 Line(6, "ExecuteBatch",
                       "ExecuteBatch FAILED[21]: request location " + dir + "/other.db is not the session's " + dir +
                           "/t.db")}),
         Described(log));
@@ -190,42 +190,6 @@ TEST_F(SessionTest, ReadsRunAsWrittenFollowTheSessionsSchemaChanges)
         ASSERT_EQ(0, session.Select(select, cursor));
         EXPECT_EQ((Strings{"x"}), ColumnValues(cursor, "a")) << change;
     }
-}
-
-// Write until the budget is full (13), delete, write again; file and log
-// stay within the budget and the stated margin.
-TEST_F(SessionTest, SizeLimitRefusesGrowthButNotDeletes)
-{
-    constexpr std::int64_t kLimit = 256 * 1024;
-    const std::string dir = Seeded("db");
-    DASession session;
-    session.SetSizeLimit(kLimit);
-    ASSERT_EQ(0, OpenAt(session, dir));
-    LogCapture log;
-    const std::string value(3000, 'v');
-    int rc = 0;
-    int rows = 0;
-    while (rc == 0 && rows < 1000) {
-        DAUpsertRequest upsert;
-        At(upsert, dir, "groups").SetData("title", value.c_str());
-        rc = session.Upsert(upsert);
-        rows += rc == 0 ? 1 : 0;
-        ASSERT_LE(std::filesystem::file_size(dir + "/t.db"), kLimit);
-        ASSERT_LE(std::filesystem::file_size(dir + "/t.db-wal"), kLimit / 4 + 8 * (4096 + 24));
-    }
-    EXPECT_EQ(13, rc);
-    EXPECT_GT(rows, 30);
-    EXPECT_EQ(Logged(6, "DASession.cpp", "Upsert", "Upsert FAILED[13]: database or disk is full"),
-              Described(log).back());
-    DADeleteRequest remove;
-    At(remove, dir, "groups").SetWhere("_ID", 10);
-    EXPECT_EQ(0, session.Delete(remove));
-    DAUpsertRequest again;
-    At(again, dir, "groups").SetData("title", value.c_str());
-    EXPECT_EQ(0, session.Upsert(again));
-    session.Close();
-    EXPECT_EQ("ok|" + std::to_string(rows + 2),
-              RawDb(dir + "/t.db").Query("SELECT * FROM pragma_integrity_check, (SELECT count(*) FROM groups)"));
 }
 
 // Connections are kept: one writer and one reader are opened however many
@@ -279,9 +243,6 @@ TEST_F(SessionTest, WaitsForAnotherConnectionInShortSteps)
     RawDb holder(dir + "/t.db");
     DAUpsertRequest upsert;
     At(upsert, dir, "groups").SetData("title", "Club");
-    const auto line = [](int priority, const char* function, const std::string& message) {
-        return Logged(priority, "DASession.cpp", function, message);
-    };
     // Held 230 ms: a session stepping 100 ms at a time would write 70 ms
     // after the release; short steps write within a few (the bound leaves
     // room for an emulated or loaded machine).
@@ -297,31 +258,34 @@ TEST_F(SessionTest, WaitsForAnotherConnectionInShortSteps)
         const int rc = session.Upsert(upsert);
         const auto done = std::chrono::steady_clock::now();
         release.join();
-        Strings expected{line(5, "IsRetryLimit", "SQLITE BUSY[1]")};
+        Strings expected{Line(5, "IsRetryLimit", "SQLITE BUSY[1]")};
         if (holdMs < 1000) {
             EXPECT_EQ(0, rc);
             EXPECT_LT(done - released, std::chrono::milliseconds(50));
-            expected.push_back(line(4, "Upsert", "Upsert SUCCESS[0]"));
+            expected.push_back(Line(4, "Upsert", "Upsert SUCCESS[0]"));
         } else {
             EXPECT_EQ(5, rc);
-            expected.push_back(line(6, "IsRetryLimit", "RETRY COUNT is reached LIMIT, SQLITE_BUSY"));
-            expected.push_back(line(6, "Upsert", "Upsert FAILED[5]: database is locked"));
+            expected.push_back(Line(6, "IsRetryLimit", "RETRY COUNT is reached LIMIT, SQLITE_BUSY"));
+            expected.push_back(Line(6, "Upsert", "Upsert FAILED[5]: database is locked"));
         }
         EXPECT_EQ(expected, Described(log));
     }
 }
 
-// The log's margin at its stated value: with a budget of 64 pages it is
-// checkpointed from 16 frames (an eighth, at least 16) and truncated once
-// it holds 32 (twice that), which a reader of an old snapshot puts off.
-TEST_F(SessionTest, SizeLimitTruncatesTheLogAtTwiceItsCheckpointSize)
+// The size budget (64 pages): the log is checkpointed from 16 frames (an
+// eighth, at least 16) and truncated once it holds 32 (twice that), which a
+// reader of an old snapshot puts off. Writes until the budget is full fail
+// with 13, a delete goes through and makes room again; file and log stay
+// within the budget and the stated margin.
+TEST_F(SessionTest, SizeLimitTruncatesTheLogAtTwiceItsCheckpointSizeAndRefusesGrowthButNotDeletes)
 {
+    constexpr std::int64_t kLimit = 64 * 4096;
     const std::string dir = Seeded("db");
     DASession session;
-    session.SetSizeLimit(64 * 4096);
+    session.SetSizeLimit(kLimit);
     ASSERT_EQ(0, OpenAt(session, dir));
     RawDb reader(dir + "/t.db");
-    const LogCapture quiet;
+    LogCapture log;
     for (int i = 1; i <= 32; ++i) {  // each commit one page: one frame
         DAUpdateRequest update;
         At(update, dir, "groups").SetWhere("_ID", 1);
@@ -330,6 +294,29 @@ TEST_F(SessionTest, SizeLimitTruncatesTheLogAtTwiceItsCheckpointSize)
         reader.Run(i == 1 ? "BEGIN; SELECT count(*) FROM groups;" : i == 31 ? "COMMIT" : "");
         EXPECT_EQ(i < 32 ? 32 + i * (4096 + 24) : 0, std::filesystem::file_size(dir + "/t.db-wal")) << i;
     }
+    const std::string value(3000, 'v');
+    int rc = 0;
+    int rows = 0;
+    while (rc == 0 && rows < 1000) {
+        DAUpsertRequest upsert;
+        At(upsert, dir, "groups").SetData("title", value.c_str());
+        rc = session.Upsert(upsert);
+        rows += rc == 0 ? 1 : 0;
+        ASSERT_LE(std::filesystem::file_size(dir + "/t.db"), kLimit);
+        ASSERT_LE(std::filesystem::file_size(dir + "/t.db-wal"), kLimit / 4 + 8 * (4096 + 24));
+    }
+    EXPECT_EQ(13, rc);
+    EXPECT_GT(rows, 30);
+    EXPECT_EQ(Line(6, "Upsert", "Upsert FAILED[13]: database or disk is full"), Described(log).back());
+    DADeleteRequest remove;
+    At(remove, dir, "groups").SetWhere("_ID", 10);
+    EXPECT_EQ(0, session.Delete(remove));
+    DAUpsertRequest again;
+    At(again, dir, "groups").SetData("title", value.c_str());
+    EXPECT_EQ(0, session.Upsert(again));
+    session.Close();
+    EXPECT_EQ("ok|" + std::to_string(rows + 2),
+              RawDb(dir + "/t.db").Query("SELECT * FROM pragma_integrity_check, (SELECT count(*) FROM groups)"));
 }
 
 // A failure at the step of a statement kept by shape logs SQLite's own text
