@@ -34,21 +34,13 @@ void Preload(DACursor& cursor)
 
 class DADatabaseTest : public TempDirTest {
 protected:
-    void Seed(const std::string& sql)
-    {
-        if (!sql.empty()) {
-            RawDb(PathOf(kFile)).Run(sql);
-        }
-    }
+    void Seed(const std::string& sql) { RawDb(PathOf(kFile)).Run(sql); }
     std::string Query(const std::string& sql) { return RawDb(PathOf(kFile)).Query(sql); }
 
-    // Sets row 1 to Cho, 012.
     int Upsert(const std::string& dir)
     {
         DAUpsertRequest request;
-        At(request, dir, "contacts").SetData("_ID", 1);
-        request.SetData("name", "Cho");
-        request.SetData("phone", "012");
+        At(request, dir, "contacts").SetData("name", "Cho");
         return m_db.Upsert(request);
     }
 
