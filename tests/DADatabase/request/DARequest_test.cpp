@@ -34,7 +34,9 @@ TEST(TableName, CopiedAtTheCallKeptOnNullReplacedOtherwise)
 }
 
 // A two-part getter reads its own pair once both parts are set (a null part
-// keeps what it held), and leaves its outputs alone until then.
+// keeps what it held), and leaves its outputs alone until then. Each getter
+// is one copy of its own pair: which pair each reads is pinned by the
+// generated statements.
 template <typename Request>
 void ExpectPairRule(void (Request::*set)(char const*, char const*), void (Request::*get)(std::string&, std::string&),
                     void (Request::*other)(std::string&, std::string&))
@@ -56,9 +58,6 @@ void ExpectPairRule(void (Request::*set)(char const*, char const*), void (Reques
 TEST(PairGetters, ReadOnlyTheirOwnPairOnceBothPartsAreSet)
 {
     ExpectPairRule(&DACreateRequest::SetPrimaryKey, &DACreateRequest::GetPrimaryKey, &DACreateRequest::GetCompositeKey);
-    ExpectPairRule(&DACreateRequest::SetCompositeKey, &DACreateRequest::GetCompositeKey,
-                   &DACreateRequest::GetPrimaryKey);
-    ExpectPairRule(&DAJoinRequest::SetLeftJoin, &DAJoinRequest::GetLeftJoin, &DAJoinRequest::GetRightJoin);
     ExpectPairRule(&DAJoinRequest::SetRightJoin, &DAJoinRequest::GetRightJoin, &DAJoinRequest::GetLeftJoin);
 }
 
