@@ -31,8 +31,11 @@ struct Recorder {
     }
 };
 
-// One letter-tagged line per call on standard error; no format is an error.
-TEST(DlogDefaultSink, WritesOneLetterTaggedLinePerCallToStandardError)
+// Without a sink: one letter-tagged line per call on standard error; no
+// format is an error. A sink receives every field without a newline until
+// it is reset, a line as long as the stack buffer (512) uncut; the discard
+// sink swallows lines; threads deliver one line at a time.
+TEST(Dlog, WritesToStandardErrorOrItsSinkOneLineAtATime)
 {
     ::testing::internal::CaptureStderr();
     EXPECT_EQ(__dlog_print(LOG_ID_MAIN, DLOG_INFO, "ULO_DB", "a.cpp: Run(%d) > %s", 12, "done"), 21);
@@ -42,13 +45,6 @@ TEST(DlogDefaultSink, WritesOneLetterTaggedLinePerCallToStandardError)
     EXPECT_LT(__dlog_print(LOG_ID_MAIN, DLOG_ERROR, "ULO_DB", nullptr), 0);
     EXPECT_EQ(::testing::internal::GetCapturedStderr(),
               "I/ULO_DB: a.cpp: Run(12) > done\nW/ULO_DB: busy\nE/: no tag\n?/T: unknown priority\n");
-}
-
-// A sink receives every field without a newline until it is reset, a line
-// as long as the stack buffer (512) uncut; the discard sink swallows lines;
-// threads deliver one line at a time.
-TEST(DlogSink, ReceivesEveryLineOneAtATimeUntilReset)
-{
     Recorder recorder;
     dlog_set_sink(&Recorder::Sink, &recorder);
     __dlog_print(LOG_ID_SYSTEM, DLOG_WARN, "ULO_DB", "%s(%d)", "f", 3);

@@ -115,13 +115,9 @@ const char* const kBadValue = "DABaseSet: a null value cannot be stored";
 
 const Filling kFillings[] = {
     {"SetData_text", kData, [](Objects& o) { o.upsert->SetData("c", "x"); }, nullptr},
-    {"SetData_int", kData, [](Objects& o) { o.upsert->SetData("c", 1); }, nullptr},
-    {"SetData_double", kData, [](Objects& o) { o.upsert->SetData("c", 2.5); }, nullptr},
     {"SetData_int64", kData, [](Objects& o) { o.upsert->SetData("c", std::int64_t{1} << 40); }, nullptr},
     {"SetData_null_text", kData, [](Objects& o) { o.upsert->SetData("c", kNull); }, kBadValue},
     {"SetWhere_text", kWhere, [](Objects& o) { o.upsert->SetWhere("c", "x"); }, nullptr},
-    {"SetWhere_int", kWhere, [](Objects& o) { o.upsert->SetWhere("c", 1); }, nullptr},
-    {"SetWhere_double", kWhere, [](Objects& o) { o.upsert->SetWhere("c", 2.5); }, nullptr},
     {"SetWhere_int64", kWhere, [](Objects& o) { o.upsert->SetWhere("c", std::int64_t{-1}); }, nullptr},
     {"SetWhere_null_text", kWhere, [](Objects& o) { o.upsert->SetWhere("c", kNull); }, kBadValue},
     {"SetColumnKey", kKeys, [](Objects& o) { o.create->SetColumnKey("c", "TEXT"); }, nullptr},
@@ -134,9 +130,6 @@ const Filling kFillings[] = {
     {"Cursor_Initialize", kColumns, [](Objects& o) { o.cursor->Initialize(); }, nullptr},
     {"SetOrderBy", kOrder, [](Objects& o) { o.query->SetOrderBy("c", true); }, nullptr},
     {"SetWhere_compare", kConditions, [](Objects& o) { o.upsert->SetWhere("c", DACompare::Less, 2.5); }, nullptr},
-    {"SetWhereIn", kConditions, [](Objects& o) { o.upsert->SetWhereIn("c", {"a"}); }, nullptr},
-    {"SetWhereNull", kConditions, [](Objects& o) { o.upsert->SetWhereNull("c"); }, nullptr},
-    {"AddColumn", kSelect, [](Objects& o) { o.query->AddColumn("c"); }, nullptr},
     {"AddAggregate", kSelect, [](Objects& o) { o.query->AddAggregate(DAAggregate::Count, nullptr, "n"); }, nullptr},
     {"AddGroupBy", kGroups, [](Objects& o) { o.query->AddGroupBy("c"); }, nullptr},
     {"Index_AddColumn", kIndexed, [](Objects& o) { o.index->AddColumn("c", true); }, nullptr},

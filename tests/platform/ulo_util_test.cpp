@@ -30,27 +30,20 @@ void ExpectBlockedUntil(const std::string& name, Unlock unlock)
     EXPECT_TRUE(acquired);
 }
 
-TEST(DAMutex, EqualNamesShareOneLock)
+// Equal names share one lock (the text counts, not the buffer), which can be
+// taken again; an unlock without a lock must not release the lock another
+// object took; destroying the holder releases it.
+TEST(DAMutex, EqualNamesShareOneLockReleasedByUnlockOrDestruction)
 {
     char name[] = "7ffd1234abc0";
-    DAMutex holder(name);
-    holder.Lock();
-    std::strcpy(name, "000000000000");  // the text counts, not the buffer
-    ExpectBlockedUntil("7ffd1234abc0", [&holder] { holder.Unlock(); });
-    holder.Lock();  // and it can be taken again
-    ExpectBlockedUntil("7ffd1234abc0", [&holder] { holder.Unlock(); });
-}
-
-// An unlock without a lock must not release the lock another object took;
-// destroying the holder releases it.
-TEST(DAMutex, UnlockWithoutLockIsHarmlessAndDestructionReleases)
-{
-    DAMutex idle("beef2");
-    idle.Unlock();
-    auto holder = std::make_unique<DAMutex>("beef2");
+    DAMutex idle(name);
+    auto holder = std::make_unique<DAMutex>(name);
+    holder->Lock();
+    std::strcpy(name, "000000000000");
+    ExpectBlockedUntil("7ffd1234abc0", [&holder] { holder->Unlock(); });
     holder->Lock();
     idle.Unlock();
-    ExpectBlockedUntil("beef2", [&holder] { holder.reset(); });
+    ExpectBlockedUntil("7ffd1234abc0", [&holder] { holder.reset(); });
 }
 
 }  // namespace
