@@ -1,13 +1,7 @@
 // Listed conditions, select lists, inserts and change counts on real files.
 
-#include <atomic>
-#include <chrono>
 #include <cmath>
 #include <cstdint>
-#include <thread>
-
-#include <sys/wait.h>
-#include <unistd.h>
 
 #include "DADatabase.h"
 #include "DASession.h"
@@ -16,10 +10,6 @@
 #include "TempDirTest.h"
 
 namespace {
-
-// Files on tmpfs where there is one: the concurrent writers commit hundreds
-// of times, and a slow disk would make them meet the busy limit.
-[[maybe_unused]] const bool g_onTmpfs = access("/dev/shm", W_OK) == 0 && setenv("TMPDIR", "/dev/shm", 1) == 0;
 
 class DAConditions : public TempDirTest {
 protected:
@@ -102,113 +92,35 @@ TEST_F(DAConditions, EachOperatorSelectsItsRows)
 }
 
 // Pages of 50 after the last (ts, id) seen, newest first, through one
-// request cleared for each page, while another thread adds newer events (at
-// a pace: a writer that never pauses starves readers under the busy rule);
-// 20 events share each time stamp, so ties cross page boundaries. Every
-// event up to the first page's newest comes exactly once, in order.
-TEST_F(DAConditions, KeysetPagesWithTiesMissNothingWhileAnotherThreadInserts)
+// request cleared for each page; 20 events share each time stamp, so ties
+// cross page boundaries. Every event comes exactly once, in order.
+TEST_F(DAConditions, KeysetPagesWithTiesMissNothing)
 {
     RawDb(PathOf("t.db"))
         .Run("CREATE TABLE e(id INTEGER PRIMARY KEY, ts INTEGER); CREATE INDEX e_ts ON e(ts, id);"
              "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 420) "
-             "INSERT INTO e(ts) SELECT 1700000000000 + i / 20 FROM n");
-    std::atomic<bool> done{false};
-    std::atomic<int> written{0};
-    std::thread writer([&] {
-        DADatabase db;
-        for (int k = 0; !done.load(); ++k, ++written) {
-            DAInsertRequest insert;
-            At(insert, Dir(), "e").SetData("ts", std::int64_t{1700000000100 + k / 3});
-            std::int64_t id = 0;
-            EXPECT_EQ(0, db.Insert(insert, id));
-            std::this_thread::sleep_for(std::chrono::milliseconds(5));  // events come at a pace
-        }
-    });
-    while (written.load() == 0) {
-        std::this_thread::yield();
-    }
-    std::vector<std::int64_t> seen;
+             "INSERT INTO e(ts) SELECT 1700000000000 + i / 20 FROM n");  // 20 rows a stamp, 50 a page
+    std::string seen;
     DAQueryRequest page;
     At(page, Dir(), "e").SetOrderBy("ts", true);
     page.SetOrderBy("id", true);
     page.SetLimit(50);
-    for (std::int64_t ts = INT64_MAX, id = INT64_MAX;;) {
+    for (std::int64_t ts = INT64_MAX, id = INT64_MAX, count = 50; count == 50;) {
         page.ClearWhere();
         page.SetWhereRow({"ts", "id"}, DACompare::Less, {ts, id});
         DACursor cursor;
-        const int rc = DADatabase().Query(page, cursor);
-        EXPECT_EQ(0, rc);
+        ASSERT_EQ(0, DADatabase().Query(page, cursor));
         while (cursor.MoveToNext() == 0) {
             EXPECT_EQ(0, cursor.GetInt64("ts", ts) + cursor.GetInt64("id", id));
-            seen.push_back(id);
+            seen += std::to_string(id) + " ";
         }
-        if (rc != 0 || cursor.GetCount() < 50) {
-            break;
-        }
+        count = cursor.GetCount();
     }
-    done.store(true);
-    writer.join();
-    EXPECT_GT(seen.front(), 420) << "the writer's first event is on the first page";
-    ASSERT_GE(seen.size(), 420U);
-    for (std::size_t i = 0; i < seen.size(); ++i) {
-        ASSERT_EQ(seen.front() - static_cast<std::int64_t>(i), seen[i]) << i;
+    std::string expected;
+    for (int id = 420; id > 0; --id) {
+        expected += std::to_string(id) + " ";
     }
-    EXPECT_EQ(1, seen.back());
-}
-
-// Every refused form: one line, nothing stored (the statement unchanged).
-TEST_F(DAConditions, RefusedFormsStoreNothingWithOneLine)
-{
-    const std::pair<void (*)(DAUpsertRequest&), const char*> cases[] = {
-        {[](DAUpsertRequest& r) {
-             r.SetWhereRow({"a", "b c"}, DACompare::Less, {1, 2});
-         },
-         "INVALID COLUMN NAME, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) {
-             r.SetWhereRow({"a", nullptr}, DACompare::Less, {1, 2});
-         },
-         "INVALID COLUMN NAME, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) {
-             r.SetWhereRow({"a", "b"}, DACompare::Less, {1});
-         },
-         "COLUMN AND VALUE COUNTS DIFFER, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetWhereRow({}, DACompare::Less, {}); },
-         "COLUMN AND VALUE COUNTS DIFFER, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetWhereRow({"a"}, DACompare::Like, {"x"}); },
-         "INVALID OPERATOR, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetWhereRow({"a"}, DACompare::Less, {static_cast<char const*>(nullptr)}); },
-         "NULL VALUE, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetWhereRow({"a"}, DACompare::Less, {NAN}); },
-         "INVALID NUMBER, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetWhereRow({"a"}, DACompare::Less, {DAValue::Blob(nullptr, 1)}); },
-         "NULL BLOB, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetWhere("a", DACompare::Contains, 5); },
-         "TEXT MATCH OF A NUMBER, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetWhere("a", DACompare::EndsWith, 5ULL); },
-         "TEXT MATCH OF A NUMBER, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetWhere("a", DACompare::StartsWith, std::string(49999, '%').c_str()); },
-         "PATTERN TOO LONG, CONDITION NOT STORED"},
-        {[](DAUpsertRequest& r) { r.SetIncrement("a;b", 1); }, "INVALID COLUMN NAME, VALUE NOT STORED"},
-        {[](DAUpsertRequest& r) { r.AddConflictKey("t.k"); }, "INVALID COLUMN NAME, KEY NOT STORED"},
-        {[](DAUpsertRequest& r) { r.AddConflictKey(nullptr); }, "INVALID COLUMN NAME, KEY NOT STORED"},
-    };
-    for (const auto& [set, line] : cases) {
-        DAUpsertRequest request;
-        request.SetTable("t");
-        request.SetData("v", "1");
-        std::string before;
-        std::string after;
-        DASqlGenerator().GetUpsertSql(request, before);
-        const LogCapture log;
-        set(request);
-        DASqlGenerator().GetUpsertSql(request, after);
-        EXPECT_EQ(before, after) << line;
-        std::vector<DABaseSet::Condition> conditions;
-        request.GetConditions(conditions);
-        EXPECT_TRUE(conditions.empty()) << line;
-        ASSERT_EQ(1U, log.Lines().size()) << line;
-        EXPECT_EQ(line, log.Lines()[0].message);
-    }
+    EXPECT_EQ(expected, seen);
 }
 
 }  // namespace

@@ -17,16 +17,6 @@ namespace {
 
 class DAQueryFile : public TempDirTest {};
 
-int Query(const std::string& dir, const char* table, bool descending, int offset, DACursor& cursor, int count = 2)
-{
-    DAQueryRequest request;
-    request.SetPath(dir.c_str(), "q.db");
-    request.SetTable(table);
-    request.SetOrderBy("n", descending);
-    request.SetLimit(count, offset);
-    return DADatabase().Query(request, cursor);
-}
-
 // Which overload a call SetData("c", T) picks, found by the compiler: each
 // probe hides one overload behind a deleted twin, so a call that picked it
 // no longer compiles; kNone: no call compiles (ambiguous).
@@ -167,8 +157,12 @@ TEST_F(DAQueryFile, GetInt64ReadsTheRangeAndStampsFromEitherWriter)
     upsert.SetTable("t");
     upsert.SetData("v", std::int64_t{1700000000123});
     ASSERT_EQ(0, DADatabase().Upsert(upsert));
+    DAQueryRequest query;
+    query.SetPath(Dir().c_str(), "q.db");
+    query.SetTable("t");
+    query.SetOrderBy("n");
     DACursor cursor;
-    ASSERT_EQ(0, Query(Dir(), "t", false, 0, cursor, -1));
+    ASSERT_EQ(0, DADatabase().Query(query, cursor));
     const std::int64_t reads[] = {1700000000123, INT64_MIN, INT64_MAX, 0, 0, 1700000000456};  // 0: fails
     LogCapture log;
     for (const std::int64_t expected : reads) {

@@ -294,25 +294,3 @@ TEST_F(SessionTest, SizeLimitTruncatesTheLogAtTwiceItsCheckpointSizeAndRefusesGr
     EXPECT_EQ("ok|" + std::to_string(rows + 2),
               RawDb(dir + "/t.db").Query("SELECT * FROM pragma_integrity_check, (SELECT count(*) FROM groups)"));
 }
-
-// A failure at the step of a statement kept by shape logs SQLite's own text
-// where a per-call visit logs the generic one; codes and the other lines
-// agree.
-TEST_F(SessionTest, StepFailureOfAKeptStatementLogsSqlitesText)
-{
-    const std::string dir = Seeded("db");
-    RawDb(dir + "/t.db").Run("CREATE TABLE big(v INTEGER); INSERT INTO big VALUES (1 << 62), (1 << 62);");
-    DAQueryRequest sum;
-    At(sum, dir, "big").AddAggregate(DAAggregate::Sum, "v", "s");
-    DASession session;
-    ASSERT_EQ(0, OpenAt(session, dir));
-    DACursor cursor;
-    LogCapture log;
-    EXPECT_EQ(1, DADatabase().Query(sum, cursor));
-    EXPECT_EQ(1, session.Query(sum, cursor));
-    EXPECT_EQ((Strings{"6 DADatabasePasrser.cpp:ParseDatabase > SQLITE STEP ERROR!!! SQL logic error",
-                       "6 DADatabase.cpp:Query > QUERY FAILED[1]: integer overflow",
-                       "6 DADatabasePasrser.cpp:ParseDatabase > SQLITE STEP ERROR!!! integer overflow",
-                       "6 DASession.cpp:Query > QUERY FAILED[1]: integer overflow"}),
-              Described(log));
-}

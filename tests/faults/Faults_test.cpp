@@ -470,46 +470,6 @@ INSTANTIATE_TEST_SUITE_P(Every, IoFaults, ::testing::ValuesIn(kIoCases),
 
 using Faults = TempDirTest;
 
-// Backups of a changing file in a process killed at random moments, on a
-// file system that loses what was not synced: the backup is always a whole
-// file holding one committed state.
-TEST_F(Faults, PowerCutDuringBackupsLeavesAWholeBackup)
-{
-    RawDb(PathOf("t.db"))
-        .Run("CREATE TABLE t(k INTEGER PRIMARY KEY, v BLOB); CREATE TABLE n(c INTEGER); "
-             "INSERT INTO n VALUES (0);");
-    std::mt19937 random(27);
-    for (int round = 0; round < 5; ++round) {
-        const pid_t pid = fork();
-        if (pid == 0) {
-            const faultfs::Installed fs;
-            dlog_set_sink(&dlog_discard_sink, nullptr);
-            RawDb db(PathOf("t.db"));
-            DABasePath from;
-            DABasePath to;
-            At(from, Dir());
-            to.SetPath(Dir().c_str(), "copy.db");
-            for (;;) {  // until killed
-                db.Run("BEGIN; INSERT INTO t(v) SELECT randomblob(3000) FROM t LIMIT 50; INSERT INTO t(v) VALUES "
-                       "(randomblob(3000)); UPDATE n SET c = (SELECT count(*) FROM t); COMMIT");
-                DADatabase().Backup(from, to);
-            }
-        }
-        ASSERT_GT(pid, 0);
-        usleep(std::uniform_int_distribution<useconds_t>(30000, 300000)(random));
-        kill(pid, SIGKILL);
-        waitpid(pid, nullptr, 0);
-        if (FileExists("copy.db")) {
-            EXPECT_EQ("ok|1",
-                      RawDb(PathOf("copy.db"))
-                          .Query("SELECT (SELECT * FROM pragma_quick_check), (SELECT c FROM n) = count(*) "
-                                 "FROM t"))
-                << round;
-        }
-    }
-    EXPECT_TRUE(FileExists("copy.db"));
-}
-
 // Quotes, format and comment characters, separators, UTF-8, control bytes
 // (no NUL), SQL; sometimes empty, sometimes long.
 std::string RandomText(std::mt19937& random)

@@ -4,10 +4,12 @@
 #include <cstdio>
 #include <string>
 
+#include <DAAddColumnRequest.h>
 #include <DABasePath.h>
 #include <DABaseSet.h>
 #include <DABatchRequest.h>
 #include <DAColumnName.h>
+#include <DACreateIndexRequest.h>
 #include <DACreateRequest.h>
 #include <DACursor.h>
 #include <DADatabase.h>
@@ -18,14 +20,20 @@
 #include <DAJoinRequest.h>
 #include <DALogger.h>
 #include <DAMutex.h>
+#include <DAOwnedString.h>
 #include <DAQueryRequest.h>
 #include <DARow.h>
+#include <DASalvageReport.h>
+#include <DASearchIndexRequest.h>
+#include <DASearchRequest.h>
 #include <DASelectRequest.h>
 #include <DASession.h>
 #include <DASqlGenerator.h>
 #include <DATypedCursor.h>
 #include <DAUpdateRequest.h>
 #include <DAUpsertRequest.h>
+#include <DAValue.h>
+#include <DAWatch.h>
 #include <dlog.h>
 
 int main(int argc, char** argv)

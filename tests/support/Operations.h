@@ -92,11 +92,12 @@ inline const Operation kOperations[] = {
          DAUpsertRequest upsert;
          At(upsert, dir, "contacts").SetData("_ID", 1);
          upsert.SetData("name", "Cho");
+         upsert.SetBlob("phone", "099", 3);  // bound, and when it fails SQLite's text all the same
          const int rc = RUN(t, Upsert, upsert);
          return rc * 10 + RUN(t, Upsert, At(upsert, dir, "people"));
      },
      0,
-     "1 / / ok|0/contacts;contacts_by_name;groups/1|Cho|NULL;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "1 / / ok|0/contacts;contacts_by_name;groups/1|Cho|099;2|Lee|011;3|Park|012/1|Family;2|Work\n"
      "4 DADatabase.cpp:Upsert > Upsert SUCCESS[0]\n"
      "6 DADatabase.cpp:Upsert > Upsert FAILED[1]: no such table: people"},
     {"update",  // a range; the second changes the same rows again, the failing one leaves the count alone
