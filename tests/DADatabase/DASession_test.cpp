@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <chrono>
 #include <functional>
-#include <regex>
 #include <string>
 #include <thread>
 #include <tuple>
@@ -118,8 +117,7 @@ TEST_P(SessionOperation, MatchesDatabase)
         EXPECT_EQ(row.expected, Summary(expected, expectedRows, perCall, expectedLines));
     }
     for (std::string& line : expectedLines) {
-        line = std::regex_replace(line, std::regex("DADatabase\\.cpp"), "DASession.cpp");
-        line = std::regex_replace(line, std::regex(perCall), held);
+        line = Replaced(Replaced(line, "DADatabase.cpp", "DASession.cpp"), perCall, held);
     }
     log.Clear();
     EXPECT_EQ(expected, row.run(viaSession, held, rows));

@@ -8,7 +8,6 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
-#include <regex>
 #include <string>
 #include <vector>
 
@@ -75,9 +74,9 @@ int PerCall(const std::string& dir, const char* table, int step)
 const Writer kWriters[] = {
     PerCall,
     [](const std::string& dir, const char* table, int step) {  // another program
-        const std::string sql[] = {"INSERT INTO T(_ID) VALUES(NULL)", "UPDATE T SET _ID = _ID", "DELETE FROM T"};
-        const std::string command = "sqlite3 " + dir + "/t.db \"" + sql[step] + "\"";
-        return WEXITSTATUS(std::system(std::regex_replace(command, std::regex("\\bT\\b"), table).c_str()));
+        const std::string sql[] = {"INSERT INTO @(_ID) VALUES(NULL)", "UPDATE @ SET _ID = _ID", "DELETE FROM @"};
+        return WEXITSTATUS(
+            std::system(("sqlite3 " + dir + "/t.db \"" + Replaced(sql[step], "@", table) + "\"").c_str()));
     },
     [](const std::string& dir, const char* table, int step) {  // leaves the file in WAL mode
         DASession session;

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
-# Installs the build tree into a fresh prefix, then builds and runs a program
-# against the installed package twice: once with pkg-config, once with
-# CMake's find_package. The programs run with LD_LIBRARY_PATH unset: the
+# Installs the build tree into a fresh prefix, compiles every installed
+# header on its own, then builds and runs a program against the installed
+# package twice: once with pkg-config, once with CMake's find_package. The programs run with LD_LIBRARY_PATH unset: the
 # installed libraries must find each other on their own, by their run path
 # $ORIGIN. Installed under the prefix /usr (staged with DESTDIR) they carry
 # no run path at all, as system libraries.
@@ -37,6 +37,12 @@ export PKG_CONFIG_PATH=$libdir/pkgconfig
 "$cxx" -std=c++17 "$here/consumer.cpp" -o "$work/consumer_pc" $(pkg-config --cflags --libs ulo_db) -Wl,-rpath,"$libdir"
 mkdir "$work/run_pc"
 "$work/consumer_pc" "$work/run_pc"
+
+echo "-- every installed header compiles on its own"
+# shellcheck disable=SC2016,SC2046
+find "$prefix/include" -name '*.h' -printf '%f\n' | xargs -P "$(nproc)" -I{} sh -c \
+    'echo "#include <{}>" | "$0" -std=c++17 -fsyntax-only -x c++ - "$@" || { echo "{} fails alone" >&2; exit 255; }' \
+    "$cxx" $(pkg-config --cflags ulo_db)
 
 echo "-- find_package"
 cmake -S "$here/consumer" -B "$work/consumer_build" -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_CXX_COMPILER="$cxx" >/dev/null

@@ -63,6 +63,15 @@ inline Strings Described(const LogCapture& log)
     return out;
 }
 
+// text with every from replaced by to.
+inline std::string Replaced(std::string text, const std::string& from, const std::string& to)
+{
+    for (std::size_t at = text.find(from); at != std::string::npos; at = text.find(from, at + to.size())) {
+        text.replace(at, from.size(), to);
+    }
+    return text;
+}
+
 // The busy warnings "SQLITE BUSY[1]".."SQLITE BUSY[n]" written from file.
 inline Strings BusyWarnings(const std::string& file, int n)
 {

@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <mutex>
-#include <regex>
 #include <string>
 #include <vector>
 
@@ -50,11 +49,14 @@ public:
 private:
     static void Sink(int /*logId*/, int prio, const char* /*tag*/, const char* text, void* user)
     {
-        static const std::regex layout(R"(([^:]*): ([^(]*)\(\d+\) > ([\s\S]*))");
-        std::cmatch fields;
         LogLine line{prio, "", "", text};
-        if (std::regex_match(text, fields, layout)) {
-            line = {prio, fields[1], fields[2], fields[3]};
+        const std::string whole = text;  // "file: function(digits) > message"
+        const std::size_t colon = whole.find(':');
+        const std::size_t open = whole.find('(', colon);
+        const std::size_t close = whole.find(") > ", open);
+        if (close != std::string::npos && whole.compare(colon, 2, ": ") == 0 && close > open + 1 &&
+            whole.find_first_not_of("0123456789", open + 1) == close) {
+            line = {prio, whole.substr(0, colon), whole.substr(colon + 2, open - colon - 2), whole.substr(close + 4)};
         }
         auto* self = static_cast<LogCapture*>(user);
         const std::lock_guard<std::mutex> guard(self->m_mutex);

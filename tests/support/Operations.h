@@ -521,18 +521,15 @@ inline Strings Cells(DACursor& cursor)
 
 // What a row gave, as one text: its code, the cells it read, the file, its
 // lines.
-inline std::string Summary(int rc, DACursor& cursor, const std::string& dir, Strings lines)
+inline std::string Summary(int rc, DACursor& cursor, const std::string& dir, const Strings& lines)
 {
     std::string out = std::to_string(rc) + " /";
     for (const std::string& cell : Cells(cursor)) {
         out += " " + cell;
     }
     out += " / " + Content(dir);
-    for (std::string& line : lines) {
-        for (std::size_t at = line.find(dir); at != std::string::npos; at = line.find(dir)) {
-            line.replace(at, dir.size(), "DIR");
-        }
-        out += "\n" + line;
+    for (const std::string& line : lines) {
+        out += "\n" + Replaced(line, dir, "DIR");
     }
     return out;
 }
