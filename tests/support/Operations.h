@@ -34,6 +34,10 @@ struct Target {
 };
 #define RUN(target, operation, ...)                                                                                    \
     ((target).session != nullptr ? (target).session->operation(__VA_ARGS__) : (target).db->operation(__VA_ARGS__))
+// An operation on a whole file: the session's own, or location per call.
+#define RUN_AT(target, location, operation, ...)                                                                       \
+    ((target).session != nullptr ? (target).session->operation(__VA_ARGS__)                                            \
+                                 : (target).db->operation(location, __VA_ARGS__))
 
 // What a row is to the fault driver: kSteps, it changes the file in more
 // than one step (after a fault the file is whole, at any of its steps);
@@ -228,9 +232,9 @@ inline const Operation kOperations[] = {
          bool groups = false;
          bool people = true;
          DABasePath at;
-         const int rc = t.session != nullptr
-             ? t.session->CheckExistTable("groups", groups) * 10 + t.session->CheckExistTable("people", people)
-             : t.db->CheckExistTable(At(at, dir), "groups", groups) * 10 + t.db->CheckExistTable(at, "people", people);
+         At(at, dir);
+         const int rc =
+             RUN_AT(t, at, CheckExistTable, "groups", groups) * 10 + RUN_AT(t, at, CheckExistTable, "people", people);
          Note(cursor, groups && !people ? "yes" : "no");
          return rc;
      },
@@ -276,10 +280,9 @@ inline const Operation kOperations[] = {
          int rc = RUN(t, Migrate, step, 3) + RUN(t, Migrate, step, 0);  // too new, below 1: refused
          rc = rc * 10 + RUN(t, Migrate, step, 1) * 10 + RUN(t, Migrate, step, 1);  // the second is skipped
          rc = rc * 10 + RUN(t, Migrate, failing, 2);
-         rc = rc * 10 +
-             (t.session != nullptr
-                  ? t.session->GetVersion(version) + t.session->Compact() + t.session->GetSpace(bytes[0], bytes[1])
-                  : t.db->GetVersion(at, version) + t.db->Compact(at) + t.db->GetSpace(at, bytes[0], bytes[1]));
+         rc = rc * 10 + RUN_AT(t, at, GetVersion, version) +
+             (t.session != nullptr ? t.session->Compact() : t.db->Compact(at)) +
+             RUN_AT(t, at, GetSpace, bytes[0], bytes[1]);
          Note(cursor, std::to_string(version) + " " + std::to_string(bytes[0]) + " " + std::to_string(bytes[1]));
          return rc;
      },
@@ -305,8 +308,7 @@ inline const Operation kOperations[] = {
          search.AddSnippet("name", "<", ">", 2, "hit");
          int rc = RUN(t, Migrate, step, 1) * 10 + RUN(t, Search, search, cursor);
          DABasePath at;
-         rc = rc * 10 +
-             (t.session != nullptr ? t.session->DropSearchIndex("names") : t.db->DropSearchIndex(At(at, dir), "names"));
+         rc = rc * 10 + RUN_AT(t, At(at, dir), DropSearchIndex, "names");
          return rc * 10 + RUN(t, Search, search, cursor) + RUN(t, CreateSearchIndex, index);
      },
      kSteps | kHeavy,
@@ -340,8 +342,7 @@ inline const Operation kOperations[] = {
          DABasePath at;
          At(at, dir);
          for (const char* name : {"titles;", "titles"}) {  // the second removes everything, its table gone
-             rc =
-                 rc * 100 + (t.session != nullptr ? t.session->DropSearchIndex(name) : t.db->DropSearchIndex(at, name));
+             rc = rc * 100 + RUN_AT(t, at, DropSearchIndex, name);
          }
          return static_cast<int>(rc);
      },
@@ -406,9 +407,7 @@ inline const Operation kOperations[] = {
          DABasePath at;
          const int rc = watch.Open(At(at, dir)) + watch.AddTable("contacts");
          watch.Close();
-         return rc * 100 +
-             (t.session != nullptr ? t.session->Unwatch("contacts") * 10 + t.session->Unwatch("a b")
-                                   : t.db->Unwatch(at, "contacts") * 10 + t.db->Unwatch(at, "a b"));
+         return rc * 100 + RUN_AT(t, at, Unwatch, "contacts") * 10 + RUN_AT(t, at, Unwatch, "a b");
      },
      kSteps | kHeavy,
      "21 / / ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
@@ -425,14 +424,13 @@ inline const Operation kOperations[] = {
          DASelectRequest select;
          std::vector<std::string> problems;
          DASession* s = t.session;
-         int rc = s != nullptr ? s->Backup(copy) : t.db->Backup(at, copy);
+         int rc = RUN_AT(t, at, Backup, copy);
          rc = rc * 10 + RUN(t, Delete, At(remove, dir, "contacts"));  // every row, back with the restore
-         rc = rc * 10 +
-             (s != nullptr
-                  ? s->CheckIntegrity(true, problems) + s->RebuildIndexes() + s->Restore(copy)
-                  : t.db->CheckIntegrity(at, true, problems) + t.db->RebuildIndexes(at) + t.db->Restore(copy, at));
-         rc = rc * 100 + (s != nullptr ? s->Backup(at) : t.db->Backup(at, at));  // onto itself: 21
-         rc = rc * 10 + (s != nullptr ? s->Backup(copy) : t.db->Backup(at, copy));  // the restore left no log
+         rc = rc * 10 + RUN_AT(t, at, CheckIntegrity, true, problems) +
+             (s != nullptr ? s->RebuildIndexes() + s->Restore(copy)
+                           : t.db->RebuildIndexes(at) + t.db->Restore(copy, at));
+         rc = rc * 100 + RUN_AT(t, at, Backup, at);  // onto itself: 21
+         rc = rc * 10 + RUN_AT(t, at, Backup, copy);  // the restore left no log
          return rc * 10 + RUN(t, Select, Make(select, dir, "contacts"), cursor) + static_cast<int>(problems.size());
      },
      kSteps | kHeavy,
