@@ -74,4 +74,29 @@ TEST(DASplitLiterals, TakesOutTheLiteralsOfPlainDmlOnly)
     EXPECT_FALSE(DASplitLiterals((in + ", '999')").c_str(), shape, values)) << "more literals than parameters";
 }
 
+// Kept statements stay within the capacity: the least recently used one is
+// finalized, the others are taken back by shape.
+TEST(DAStatementCache, KeepsTheMostRecentlyUsedWithinItsCapacity)
+{
+    sqlite3* db = nullptr;
+    ASSERT_EQ(SQLITE_OK, sqlite3_open(":memory:", &db));
+    {
+        DAStatementCache cache;
+        for (std::size_t i = 0; i <= DAStatementCache::kCapacity; ++i) {
+            const std::string shape = "SELECT " + std::to_string(i);
+            sqlite3_stmt* stmt = nullptr;
+            ASSERT_EQ(SQLITE_OK, sqlite3_prepare_v2(db, shape.c_str(), -1, &stmt, nullptr));
+            cache.Put(shape, stmt);
+        }
+        int open = 0;
+        for (sqlite3_stmt* stmt = sqlite3_next_stmt(db, nullptr); stmt != nullptr; stmt = sqlite3_next_stmt(db, stmt)) {
+            ++open;
+        }
+        EXPECT_EQ(static_cast<int>(DAStatementCache::kCapacity), open);
+        EXPECT_EQ(nullptr, cache.Take("SELECT 0"));
+        sqlite3_finalize(cache.Take("SELECT 1"));
+    }
+    EXPECT_EQ(SQLITE_OK, sqlite3_close(db));
+}
+
 }  // namespace
