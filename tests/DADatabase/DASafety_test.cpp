@@ -188,15 +188,12 @@ std::string RawQuery(sqlite3* db, const char* sql)
 template <typename Body>
 pid_t Child(const std::string& path, Body body)
 {
-    const pid_t pid = fork();
-    if (pid == 0) {
+    return Spawn([&] {
         sqlite3* db = nullptr;
         sqlite3_open(path.c_str(), &db);
         sqlite3_busy_timeout(db, 5000);
-        body(db);
-        _exit(0);
-    }
-    return pid;
+        return body(db), 0;
+    });
 }
 
 }  // namespace

@@ -24,17 +24,10 @@ const char* const kSeed = "CREATE TABLE contacts(_ID INTEGER PRIMARY KEY, name T
                           "CREATE TABLE groups(_ID INTEGER PRIMARY KEY, title TEXT);"
                           "INSERT INTO contacts(name) VALUES ('Kim');";
 
-// Runs write in a child process (the log discarded); its exit code.
+// Runs write in a child process; its exit code.
 int InChild(const std::function<int()>& write)
 {
-    const pid_t pid = fork();
-    if (pid == 0) {
-        dlog_set_sink(&dlog_discard_sink, nullptr);
-        _exit(write());
-    }
-    int status = -1;
-    waitpid(pid, &status, 0);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+    return ExitOf(Spawn(write));
 }
 
 int Threads()
@@ -73,6 +66,15 @@ int PerCall(const std::string& dir, const char* table, int step)
 
 const Writer kWriters[] = {
     PerCall,
+    [](const std::string& dir, const char* table, int step) {
+        DABatchRequest batch;
+        DADeleteRequest nothing;  // changes nothing
+        At(nothing, dir, table).SetWhere("_ID", 99);
+        At(batch, dir).Add(nothing);
+        Requests r(dir, table);
+        step == 0 ? batch.Add(r.insert) : step == 1 ? batch.Add(r.update) : batch.Add(r.remove);
+        return DADatabase().ExecuteBatch(batch);
+    },
     [](const std::string& dir, const char* table, int step) {  // another program
         const std::string sql[] = {"INSERT INTO @(_ID) VALUES(NULL)", "UPDATE @ SET _ID = _ID", "DELETE FROM @"};
         return WEXITSTATUS(
@@ -203,9 +205,10 @@ TEST_F(WatchTest, RefusesBadInput)
     EXPECT_EQ("", RawDb(PathOf("t.db")).Query("SELECT name FROM sqlite_master WHERE name LIKE 'ulo%'"));
 }
 
-// A writer killed right after its commit: the change is still reported.
-// The file replaced by another: 14, the watch closed.
-TEST_F(WatchTest, KilledWriterAndAReplacedFile)
+// A writer killed right after its commit: the change is still reported. No
+// descriptor to be had: Open fails with 14 and holds nothing. The file
+// replaced by another: 14, the watch closed.
+TEST_F(WatchTest, KilledWriterNoDescriptorsAndAReplacedFile)
 {
     DAWatch watch;
     Strings changed;
@@ -214,6 +217,21 @@ TEST_F(WatchTest, KilledWriterAndAReplacedFile)
     InChild([&] { return PerCall(Dir(), "contacts", 0) + raise(SIGKILL); });
     EXPECT_EQ(0, watch.Wait(5000, changed));
     EXPECT_EQ(Strings{"contacts"}, changed);
+    EXPECT_EQ(0, InChild([&] {
+                  const int before = OpenDescriptorCount();
+                  std::vector<int> taken;
+                  for (int fd = dup(0); fd >= 0; fd = dup(0)) {
+                      taken.push_back(fd);
+                  }
+                  close(taken.back());  // one left: the file opens, the watch's own descriptor does not
+                  taken.pop_back();
+                  DAWatch starved;
+                  const int rc = starved.Open(m_location);
+                  for (const int fd : taken) {
+                      close(fd);
+                  }
+                  return rc == 14 && starved.GetFd() == -1 && OpenDescriptorCount() == before ? 0 : 1;
+              }));
     RawDb(PathOf("other.db")).Run(kSeed);
     std::filesystem::rename(PathOf("other.db"), PathOf("t.db"));
     EXPECT_EQ(14, watch.Check(changed));

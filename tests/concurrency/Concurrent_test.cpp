@@ -219,9 +219,7 @@ TEST_F(ConcurrentDatabase, SessionAndPerCallProcessesShareAFile)
     RawDb(PathOf("t.db")).Run("CREATE TABLE items(name INTEGER PRIMARY KEY, value TEXT)");
     std::vector<pid_t> children;
     for (int p = 0; p < kProcesses; ++p) {
-        const pid_t pid = fork();
-        if (pid == 0) {  // exits with the number of its writes that failed
-            dlog_set_sink(&dlog_discard_sink, nullptr);
+        children.push_back(Spawn([&, p] {  // exits with the number of its writes that failed
             DABasePath location;
             DASession session;
             const bool held = p == 0 && session.Open(At(location, Dir())) == 0;
@@ -232,16 +230,14 @@ TEST_F(ConcurrentDatabase, SessionAndPerCallProcessesShareAFile)
                 upsert.SetData("value", "v");
                 failed += (held ? session.Upsert(upsert) : DADatabase().Upsert(upsert)) != 0 ? 1 : 0;
             }
-            _exit(failed);
-        }
-        children.push_back(pid);
+            return failed;
+        }));
     }
     int failed = 0;
     for (const pid_t pid : children) {
-        int status = -1;
-        EXPECT_EQ(pid, waitpid(pid, &status, 0));
-        ASSERT_TRUE(WIFEXITED(status)) << status;
-        failed += WEXITSTATUS(status);
+        const int rc = ExitOf(pid);
+        ASSERT_GE(rc, 0);
+        failed += rc;
     }
     EXPECT_LT(failed, kProcesses * kRows / 10);
     EXPECT_EQ("ok|" + std::to_string(kProcesses * kRows - failed),
@@ -249,13 +245,16 @@ TEST_F(ConcurrentDatabase, SessionAndPerCallProcessesShareAFile)
 }
 
 // Three upgrade steps (a table, an added column, an index), each also
-// inserting one marker row, run at once by every thread, each on a
-// connection of its own: every call succeeds, each step runs exactly once
-// and exactly one caller reports it applied.
-TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAcrossConnections)
+// inserting one marker row, run at once by 4 threads and 4 processes, each
+// on a connection of its own, each also incrementing one counter between
+// the steps: every call succeeds, each step runs exactly once, exactly one
+// caller reports it applied, and the counter ends exact.
+TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAndCountersStayExact)
 {
-    std::vector<std::unique_ptr<DABatchRequest>> steps;  // each thread's three, made before they start
-    for (int i = 0; i < kThreads * 3; ++i) {
+    constexpr int kIncrements = 20;
+    RawDb(PathOf("t.db")).Run("CREATE TABLE c(k TEXT PRIMARY KEY, n INTEGER); INSERT INTO c VALUES ('a', 0)");
+    std::vector<std::unique_ptr<DABatchRequest>> steps;  // each caller's three, made before any starts
+    for (int i = 0; i < 2 * kThreads * 3; ++i) {
         const int version = i % 3 + 1;
         DACreateRequest create;
         DAAddColumnRequest note;
@@ -274,21 +273,58 @@ TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAcrossConnections)
             step.Add(row);
         }
     }
-    std::atomic<int> applied{0};  // the callers that applied each version, in 4 bits each
-    const LogCapture log;
-    RunTogether([&](int t) {
+    DAUpdateRequest counter;
+    At(counter, Dir(), "c").SetWhere("k", "a");
+    counter.SetIncrement("n", 1);
+    // The steps caller w applied, in bits 1..3; bit 4 for any failed call.
+    const auto upgrade = [&](int w) {
+        int bits = 0;
         for (int version = 1; version <= 3; ++version) {
             bool done = false;
-            EXPECT_EQ(0, DADatabase().Migrate(*steps[t * 3 + version - 1], version, done)) << version;
-            applied += done ? 1 << (4 * version) : 0;
+            bits |= DADatabase().Migrate(*steps[w * 3 + version - 1], version, done) != 0 ? 16
+                : done                                                                    ? 1 << version
+                                                                                          : 0;
+            for (int i = 0; i < kIncrements; ++i) {
+                bits |= DADatabase().Update(counter) != 0 ? 16 : 0;
+            }
         }
+        return bits;
+    };
+    int go[2];
+    ASSERT_EQ(0, pipe(go));
+    std::vector<pid_t> children;
+    for (int p = 0; p < kThreads; ++p) {  // forked before any thread starts, released when the pipe closes
+        children.push_back(Spawn([&, p] {
+            close(go[1]);
+            char byte = 0;
+            return read(go[0], &byte, 1) == 0 ? upgrade(kThreads + p) : 32;
+        }));
+    }
+    close(go[0]);
+    std::atomic<int> applied{0};  // each version's count in 4 bits of its own; failures above
+    const auto count = [&applied](int bits) {
+        for (int version = 1; version <= 4; ++version) {
+            applied += ((bits >> version) & 1) << (4 * version);
+        }
+    };
+    const LogCapture log;
+    RunTogether([&](int t) {
+        if (t == 0) {
+            close(go[1]);
+        }
+        count(upgrade(t));
     });
-    EXPECT_EQ(0x1110, applied.load());
+    for (const pid_t child : children) {
+        const int bits = ExitOf(child);
+        EXPECT_GE(bits, 0);
+        count(bits);
+    }
+    EXPECT_EQ(0x01110, applied.load());
     RawDb db(PathOf("t.db"));
-    EXPECT_EQ("3;1|1;2|1;3|1",
+    EXPECT_EQ("3;1|1;2|1;3|1;" + std::to_string(2 * kThreads * 3 * kIncrements),
               db.Query("PRAGMA user_version") + ";" +
-                  db.Query("SELECT step, count(*) FROM markers WHERE step > 0 GROUP BY step"));
-    EXPECT_EQ(log.Count("RETRY COUNT is reached LIMIT, SQLITE_BUSY"), 0);
+                  db.Query("SELECT step, count(*) FROM markers WHERE step > 0 GROUP BY step") + ";" +
+                  db.Query("SELECT n FROM c"));
     EXPECT_GT(log.Count("SQLITE BUSY[1]"), 0);  // a caller waited for another's step
 }
 

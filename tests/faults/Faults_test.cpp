@@ -423,8 +423,7 @@ TEST_P(IoFaults, FailWithOneLineAndLeaveTheFile)
     c.fault(dir, file);
     const std::string before = FileBytes(file);
     const auto files = std::distance(std::filesystem::directory_iterator(dir), {});
-    const pid_t pid = fork();
-    if (pid == 0) {
+    ExitOf(Spawn([&] {
         const bool nobody = getuid() != 0 || (setgroups(0, nullptr) == 0 && setgid(65534) == 0 && setuid(65534) == 0);
         const rlimit limit{std::strstr(c.name, "SizeLimit") != nullptr ? before.size() : RLIM_INFINITY, RLIM_INFINITY};
         signal(SIGXFSZ, SIG_IGN);
@@ -457,10 +456,8 @@ TEST_P(IoFaults, FailWithOneLineAndLeaveTheFile)
         for (const std::string& line : Described(log)) {
             out << "|" << line;
         }
-        out.close();
-        _exit(0);
-    }
-    ASSERT_EQ(pid, waitpid(pid, nullptr, 0));
+        return 0;
+    }));
     chmod(dir.c_str(), 0700);
     if (FileBytes(PathOf("out")) == "-1") {
         GTEST_SKIP() << "cannot run as nobody (65534) in " << Dir();
@@ -474,64 +471,6 @@ INSTANTIATE_TEST_SUITE_P(Every, IoFaults, ::testing::ValuesIn(kIoCases),
                          [](const auto& info) { return std::string(info.param.name); });
 
 using Faults = TempDirTest;
-
-// Quotes, format and comment characters, separators, UTF-8, control bytes
-// (no NUL), SQL; sometimes empty, sometimes long.
-std::string RandomText(std::mt19937& random)
-{
-    static const std::vector<std::string> pieces{"'",  "''",   "\"",   "%", "%s%n",  ";--", "/*",
-                                                 "\\", "é",    "日本", "😀", "\x01",  "\t",  "\n",
-                                                 "\r", "\x7f", " ",    "a", " AND ", ", ",  "DROP TABLE t;"};
-    const auto pick = [&](std::size_t n) { return std::uniform_int_distribution<std::size_t>(0, n - 1)(random); };
-    std::string text;
-    for (const std::size_t length = pick(10) == 0 ? 3000 : pick(12); text.size() < length;) {
-        text += pieces[pick(pieces.size())];
-    }
-    return text;
-}
-
-// Through both sources: per call, and a session (its statements kept by
-// shape, the texts bound).
-TEST_F(Faults, RandomTextsRoundTripAsValuesAndConditions)
-{
-    std::mt19937 random(1);
-    RawDb(PathOf("t.db")).Run("CREATE TABLE t(k TEXT PRIMARY KEY, v TEXT)");
-    DADatabase db;
-    DASession session;
-    DABasePath at;
-    ASSERT_EQ(0, session.Open(At(at, Dir())));
-    for (int i = 0; i < 60; ++i) {
-        Target t{&db, i % 2 == 0 ? nullptr : &session};
-        const std::string key = RandomText(random);
-        const std::string first = RandomText(random);
-        const std::string second = RandomText(random);
-        // The rows whose key and value (if given) match.
-        const auto find = [&](const std::string& value) {
-            DASelectRequest select;
-            DACursor cursor;
-            At(select, Dir(), "t").SetWhere("k", key.c_str());
-            select.SetWhere(value.empty() ? "k" : "v", value.c_str());  // k again: dropped
-            EXPECT_EQ(0, RUN(t, Select, select, cursor));
-            return Dump(cursor);
-        };
-        DAUpsertRequest upsert;
-        At(upsert, Dir(), "t").SetData("k", key.c_str());
-        upsert.SetData("v", first.c_str());
-        ASSERT_EQ(0, RUN(t, Upsert, upsert));
-        EXPECT_EQ((Strings{"k", "v", key, first}), find(first));
-        DAUpdateRequest update;
-        At(update, Dir(), "t").SetData("v", second.c_str());
-        update.SetWhere("k", key.c_str());
-        update.SetWhere("v", first.c_str());
-        ASSERT_EQ(0, RUN(t, Update, update));
-        EXPECT_EQ((Strings{"k", "v", key, second}), find(second));
-        DADeleteRequest remove;
-        At(remove, Dir(), "t").SetWhere("k", key.c_str());
-        remove.SetWhere("v", second.c_str());
-        ASSERT_EQ(0, RUN(t, Delete, remove));
-        EXPECT_EQ(Strings(), find(""));
-    }
-}
 
 // Random moves and reads of cursors of -1 (no column) to 4 rows against a
 // model of them: each code, position and failure line.

@@ -2,11 +2,15 @@
 #define ULO_TESTS_DATABASETESTUTIL_H
 
 // Helpers shared by the tests: a compact view of the captured log lines, a
-// raw SQLite connection for seeding and checking files, and the
-// open-descriptor count of the process.
+// raw SQLite connection for seeding and checking files, the open-descriptor
+// count of the process, and child processes.
+
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <iterator>
 #include <sstream>
 #include <string>
@@ -111,6 +115,25 @@ inline Strings Dump(DACursor& cursor)
 inline int OpenDescriptorCount()
 {
     return static_cast<int>(std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {}));
+}
+
+// Runs body in a child process, its log discarded, which exits with what
+// body returns; the child's pid.
+inline pid_t Spawn(const std::function<int()>& body)
+{
+    const pid_t pid = fork();
+    if (pid == 0) {
+        dlog_set_sink(&dlog_discard_sink, nullptr);
+        _exit(body());
+    }
+    return pid;
+}
+
+// Waits for child: its exit code, or -1 when it did not exit on its own.
+inline int ExitOf(pid_t child)
+{
+    int status = -1;
+    return waitpid(child, &status, 0) == child && WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
 // A plain connection to a database file, independent of the library.

@@ -443,6 +443,29 @@ inline const Operation kOperations[] = {
      "4 DADatabase.cpp:Restore > Restore SUCCESS[0]: 4 pages\n"
      "6 DADatabase.cpp:Backup > Backup FAILED[21]: the copy would replace its own source DIR/t.db\n"
      "4 DADatabase.cpp:Backup > Backup SUCCESS[0]: 4 pages"},
+    {"hostile_texts",  // quotes, format and comment characters, UTF-8, SQL: as values and conditions, as given
+     [](Target& t, const std::string& dir, DACursor& cursor) {
+         const char* const name = "Kim's \"x\" %s%n ;-- /* \\ \xC3\xA9 \xF0\x9F\x98\x80\t' OR 1=1 --";
+         const char* const phone = "'); DROP TABLE contacts; --";
+         DAUpsertRequest upsert;
+         At(upsert, dir, "contacts").SetData("name", name);
+         upsert.SetData("phone", phone);
+         DAUpdateRequest update;
+         Make(update, dir, "contacts", "name", name).SetWhere("phone", phone);
+         update.SetData("phone", name);
+         DASelectRequest select;
+         DADeleteRequest remove;
+         const int rc = RUN(t, Upsert, upsert) + RUN(t, Update, update);
+         return rc + RUN(t, Select, Make(select, dir, "contacts", "phone", name), cursor) +
+             RUN(t, Delete, Make(remove, dir, "contacts", "name", name));
+     },
+     kSteps,
+     "0 / _ID name phone 4 Kim's \"x\" %s%n ;-- /* \\ \xC3\xA9 \xF0\x9F\x98\x80\t' OR 1=1 -- Kim's \"x\" %s%n ;-- /* "
+     "\\ \xC3\xA9 \xF0\x9F\x98\x80\t' OR 1=1 -- / "
+     "ok|0/contacts;contacts_by_name;groups/1|Kim|010;2|Lee|011;3|Park|012/1|Family;2|Work\n"
+     "4 DADatabase.cpp:Upsert > Upsert SUCCESS[0]\n"
+     "4 DADatabase.cpp:Update > update SUCCESS[0]\n"
+     "4 DADatabase.cpp:Delete > delete SUCCESS[0]"},
     {"batch",  // the second rolls back; a create counts no change
      [](Target& t, const std::string& dir, DACursor&) {
          DABatchRequest batch;
