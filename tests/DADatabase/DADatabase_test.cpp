@@ -98,12 +98,13 @@ TEST_F(DADatabaseTest, OpenDBHandsBackNullOnFailureAndEveryOperationItsCode)
     EXPECT_EQ(14, m_db.Upsert(At(upsert, missing, "contacts")));  // every write opens in one frame
     EXPECT_EQ(14, m_db.Select(At(select, missing, "contacts"), cursor));
     EXPECT_EQ(14, m_db.Query(At(query, missing, "contacts"), cursor));
+    EXPECT_EQ(14, m_db.QueryEach(query, [](DARow const&) { return true; }));
     EXPECT_EQ(14, m_db.JoinSelect(join, cursor));
     EXPECT_EQ(14, m_db.CheckExistTable(join, "contacts", exists));
     Strings expected(1 + 1 + 1, kOpenFailed);  // OpenDB's own, the write's, Select's
     expected.insert(expected.end(),
                     {Line(4, "Select", "OpenDB Error: 14"), kOpenFailed, Line(4, "Query", "OpenDB Error: 14"),
-                     kOpenFailed, kOpenFailed});
+                     kOpenFailed, Line(4, "QueryEach", "OpenDB Error: 14"), kOpenFailed, kOpenFailed});
     EXPECT_EQ(expected, Described(log));
     EXPECT_EQ(Strings{"kept"}, ColumnValues(cursor, "mine"));
     EXPECT_TRUE(exists);
