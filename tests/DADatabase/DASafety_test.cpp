@@ -57,7 +57,7 @@ TEST_F(Safety, CreatedFilesArePrivate)
             DABasePath location;
             location.SetPath(Dir().c_str(), name.c_str());
             DASession session;
-            session.SetFileMode(mode);
+            mode == -1 ? void() : session.SetFileMode(mode);  // -1: the default
             int version = 0;
             ASSERT_EQ(0,
                       mode == -2 ? DADatabase().GetVersion(location, version)
@@ -75,12 +75,15 @@ TEST_F(Safety, CreatedFilesArePrivate)
 
 namespace {
 
-// 2,000 rows of ~100 bytes in 4 KiB pages, an index on v.
-const char* const kRows = "PRAGMA page_size = 4096; PRAGMA user_version = 7;"
-                          "CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); CREATE INDEX t_v ON t(v);"
-                          "CREATE VIEW odd AS SELECT * FROM t WHERE k % 2;"
-                          "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 2000) "
-                          "INSERT INTO t SELECT i, printf('%0100d', i) FROM n;";
+// 2,000 rows of ~100 bytes in 4 KiB pages, an index on v; a view; a small
+// table without rowids.
+const char* const kRows =
+    "PRAGMA page_size = 4096; PRAGMA user_version = 7;"
+    "CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); CREATE INDEX t_v ON t(v);"
+    "CREATE VIEW odd AS SELECT * FROM t WHERE k % 2;"
+    "CREATE TABLE w(k TEXT PRIMARY KEY, v) WITHOUT ROWID; INSERT INTO w VALUES ('a', 1), ('b', 2);"
+    "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 2000) "
+    "INSERT INTO t SELECT i, printf('%0100d', i) FROM n;";
 
 // One kind of damage to t.db at dir, and what each operation then gives.
 struct Damage {
@@ -92,15 +95,15 @@ struct Damage {
 };
 
 const Damage kDamages[] = {
-    {"none", "", "0:0 0:0 | 0 t:2000:0 7|3|ok|2000 | 0 0:0"},
+    {"none", "", "0:0 0:0 | 0 t:2000:0 w:2:0 7|4|ok|2000 | 0 0:0"},
     {"table_page", "SELECT pageno FROM dbstat WHERE name = 't' AND pagetype = 'leaf' LIMIT 1 OFFSET 20",
-     "0:1 0:1 | 0 t:1963:37 7|3|ok|1963 | 11 0:1"},
+     "0:1 0:1 | 0 t:1963:37 w:2:0 7|4|ok|1963 | 11 0:1"},
     {"index_page", "SELECT pageno FROM dbstat WHERE name = 't_v' AND pagetype = 'leaf' LIMIT 1 OFFSET 10",
-     "0:1 0:1 | 0 t:2000:0 7|3|ok|2000 | 0 0:0"},
+     "0:1 0:1 | 0 t:2000:0 w:2:0 7|4|ok|2000 | 0 0:0"},
     // The schema is gone with the first page: nothing can be read, nothing is created.
     {"first_page", "SELECT 1", "26:1 26:1 | 26 | 26 26:1"},
     // SQLite refuses a file shorter than its header says; salvage reads what is there.
-    {"truncated", nullptr, "11:1 11:1 | 0 t:999:-1 7|3|ok|999 | 11 11:1"},
+    {"truncated", nullptr, "11:1 11:1 | 0 t:999:-1 w:2:0 7|4|ok|999 | 11 11:1"},
 };
 
 class Damaged : public TempDirTest, public ::testing::WithParamInterface<Damage> {};
