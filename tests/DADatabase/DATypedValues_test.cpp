@@ -182,6 +182,9 @@ TEST_P(TypedValues, ReadsAFileTheSqlite3ProgramWroteExactly)
     std::int64_t untouched = 5;
     EXPECT_EQ(2, row.GetInt64("nope", untouched) + row.GetInt64(2, untouched));
     EXPECT_EQ(DAValueType::Null, row.GetType("nope"));
+    EXPECT_EQ(0, cursor.MoveToPosition(1) + cursor.MoveToPrev());  // moves as DACursor's do
+    EXPECT_EQ(21, cursor.MoveToPrev() * 10 + cursor.MoveToPosition(12));
+    EXPECT_EQ(0, cursor.GetPosition());
     cursor.MoveToFirst();
     EXPECT_EQ(1, row.GetInt64("k", untouched));
     EXPECT_EQ(5, untouched);
@@ -201,7 +204,9 @@ TEST_P(TypedValues, ReadsAFileTheSqlite3ProgramWroteExactly)
     }
     lines.insert(lines.end(),
                  {Logged(4, "DATypedCursor.cpp", "MoveToNext", "Last Row"), line("GetInt64", "NO COLUMN nope"),
-                  line("GetInt64", "NO COLUMN 2"), line("GetInt64", "CURSOR RANGE ERROR!!!")});
+                  line("GetInt64", "NO COLUMN 2"), Logged(4, "DATypedCursor.cpp", "MoveToPrev", "First Row"),
+                  Logged(6, "DATypedCursor.cpp", "MoveToPosition", "Invalid Position"),
+                  line("GetInt64", "CURSOR RANGE ERROR!!!")});
     EXPECT_EQ(lines, Described(log));
 }
 
