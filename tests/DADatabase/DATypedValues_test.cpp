@@ -132,6 +132,9 @@ TEST_P(TypedValues, EveryTypeThroughEveryWriteReadsBackExactly)
     At(query, Dir(), "v").SetOrderBy("id");
     DATypedCursor cursor;
     std::string ids;
+    DAQueryRequest reversed;  // a result the cursor held before: replaced whole
+    At(reversed, Dir(), "v").SetOrderBy("id", true);
+    ASSERT_EQ(0, ON(Query, reversed, cursor));
     ASSERT_EQ(0, ON(Query, query, cursor));
     while (cursor.MoveToNext() == 0) {
         check(cursor.GetRow(), ids);

@@ -183,6 +183,7 @@ TEST_F(WatchTest, RefusesBadInput)
     Strings changed;
     LogCapture log;
     EXPECT_EQ(21, watch.Check(changed));
+    EXPECT_EQ(21, watch.AddTable("contacts"));
     std::ofstream(PathOf("text.db")) << std::string(5000, 'x');
     DABasePath bad[2];
     bad[0].SetPath(PathOf("missing").c_str(), "t.db");
@@ -197,7 +198,7 @@ TEST_F(WatchTest, RefusesBadInput)
         return Logged(6, "DAWatch.cpp", function, message);
     };
     const std::string notPlain = "AddTable FAILED[21]: table name is not a plain name";
-    EXPECT_EQ((Strings{line("Check", "WATCH NOT OPEN"),
+    EXPECT_EQ((Strings{line("Check", "WATCH NOT OPEN"), line("AddTable", "WATCH NOT OPEN"),
                        line("Open", "DB open failed. Error no(14): unable to open database file"),
                        line("Open", "DB open failed. Error no(26): file is not a database"), line("AddTable", notPlain),
                        line("AddTable", notPlain), line("AddTable", "AddTable FAILED[1]: no such table: main.people")}),
