@@ -247,8 +247,9 @@ TEST_F(ConcurrentDatabase, SessionAndPerCallProcessesShareAFile)
 // Three upgrade steps (a table, an added column, an index), each also
 // inserting one marker row, run at once by 4 threads and 4 processes, each
 // on a connection of its own, each also incrementing one counter between
-// the steps: every call succeeds, each step runs exactly once, exactly one
-// caller reports it applied, and the counter ends exact.
+// the steps: every call succeeds (repeated while it meets the busy limit),
+// each step runs exactly once, exactly one caller reports it applied, and
+// the counter ends exact.
 TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAndCountersStayExact)
 {
     constexpr int kIncrements = 20;
