@@ -280,10 +280,8 @@ TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAndCountersStayExact)
     // A call that met the retry limit (5) applied nothing, so the caller repeats it, as an app
     // would: a slow disk can starve one of eight writers for the 1.5 s the rule waits.
     const auto untilNotBusy = [](const auto& call) {
-        int rc = 5;
-        while (rc == 5) {
-            rc = call();
-        }
+        int rc = 0;
+        while ((rc = call()) == 5) {}
         return rc;
     };
     // The steps caller w applied, in bits 1..3; bit 4 for any call that failed otherwise.
@@ -291,10 +289,9 @@ TEST_F(ConcurrentDatabase, EachMigrationStepRunsOnceAndCountersStayExact)
         int bits = 0;
         for (int version = 1; version <= 3; ++version) {
             bool done = false;
-            bits |= untilNotBusy([&] { return DADatabase().Migrate(*steps[w * 3 + version - 1], version, done); }) != 0
-                ? 16
-                : done ? 1 << version
-                       : 0;
+            const int rc =
+                untilNotBusy([&] { return DADatabase().Migrate(*steps[w * 3 + version - 1], version, done); });
+            bits |= rc != 0 ? 16 : done ? 1 << version : 0;
             for (int i = 0; i < kIncrements; ++i) {
                 bits |= untilNotBusy([&] { return DADatabase().Update(counter); }) != 0 ? 16 : 0;
             }
