@@ -214,13 +214,15 @@ TEST_P(TypedValues, ReadsAFileTheSqlite3ProgramWroteExactly)
 }
 
 // QueryEach ends when visit says so (0), lets an exception through with the
-// connection given back, and over a damaged page returns 11 after visiting
-// the rows before it, as many as a typed Query keeps (and a Select, which
-// logs the step's failure and returns 0).
+// connection given back, fails a 1 GiB value with SQLite's code, and over a
+// damaged page returns 11 after visiting the rows before it, as many as a
+// typed Query keeps (and a Select, which logs the step's failure and
+// returns 0).
 TEST_P(TypedValues, QueryEachStopsThrowsAndReturnsADamagedPage)
 {
     RawDb(PathOf("t.db"))
-        .Run("PRAGMA page_size = 4096; CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); WITH RECURSIVE "
+        .Run("PRAGMA page_size = 4096; CREATE TABLE t(k INTEGER PRIMARY KEY, v TEXT); CREATE VIEW huge AS "
+             "SELECT zeroblob(1 << 30) AS b; WITH RECURSIVE "
              "n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 200) INSERT INTO t "
              "SELECT i, printf('%0200d', i) FROM n;");
     Open();
@@ -237,6 +239,10 @@ TEST_P(TypedValues, QueryEachStopsThrowsAndReturnsADamagedPage)
                  std::runtime_error);
     EXPECT_EQ(0, ON(Delete, remove));  // no read left holding the file or the session
     EXPECT_EQ(descriptors, OpenDescriptorCount());
+    DAQueryRequest huge;  // a 1 GiB value: more than SQLite hands out, so its code (18), never a crash
+    DATypedCursor none;
+    EXPECT_EQ(18, ON(QueryEach, At(huge, Dir(), "huge"), [](DARow const&) { return true; }));
+    EXPECT_EQ(18, ON(Query, huge, none));
 
     m_session.Close();
     DASession journal;  // the read holds the one connection: a write from visit is refused
