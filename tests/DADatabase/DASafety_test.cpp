@@ -71,6 +71,12 @@ TEST_F(Safety, CreatedFilesArePrivate)
         }
         umask(old);
     }
+    DASession held;  // a copy takes its source's mode less others' bits: 0000 stays 0000
+    DABasePath copy;
+    ASSERT_EQ(0, held.Open(At(copy, Dir())));
+    chmod(PathOf("t.db").c_str(), 0);
+    copy.SetPath(Dir().c_str(), "copy.db");
+    EXPECT_EQ(0, held.Backup(copy) + DAFileModeOf(PathOf("copy.db")));
 }
 
 namespace {

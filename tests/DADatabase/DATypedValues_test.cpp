@@ -240,9 +240,9 @@ TEST_P(TypedValues, QueryEachStopsThrowsAndReturnsADamagedPage)
     EXPECT_EQ(0, ON(Delete, remove));  // no read left holding the file or the session
     EXPECT_EQ(descriptors, OpenDescriptorCount());
     DAQueryRequest huge;  // a 1 GiB value: more than SQLite hands out, so its code (18), never a crash
-    DATypedCursor none;
+    DATypedCursor cursor;
     EXPECT_EQ(18, ON(QueryEach, At(huge, Dir(), "huge"), [](DARow const&) { return true; }));
-    EXPECT_EQ(18, ON(Query, huge, none));
+    EXPECT_EQ(18, ON(Query, huge, cursor));
 
     m_session.Close();
     DASession journal;  // the read holds the one connection: a write from visit is refused
@@ -256,7 +256,6 @@ TEST_P(TypedValues, QueryEachStopsThrowsAndReturnsADamagedPage)
     std::fstream(PathOf("t.db"), std::ios::in | std::ios::out | std::ios::binary).seekp(4 * 4096)
         << std::string(4096, '\x7f');
     Open();
-    DATypedCursor cursor;
     visited = 0;
     LogCapture log;
     EXPECT_EQ(11, ON(QueryEach, query, [&](DARow const&) { return ++visited > 0; }));
