@@ -50,6 +50,13 @@ struct DAWatchState;
 /// replaced"; the watch is then closed (Open it again to watch the file now
 /// at that path).
 ///
+/// A watching process needs write access to the file and its folder, as
+/// every writer does: AddTable writes (or confirms) the triggers in a write
+/// transaction, and Check waits out a commit by taking the write lock for
+/// an instant. A process that may only read the file (a group member of a
+/// 0640 file) gets 8 (SQLITE_READONLY) from AddTable, and so watches
+/// nothing.
+///
 /// One DAWatch is used by one thread at a time; any number of watches, in
 /// one or several processes, may watch one file. Not copyable. Every
 /// operation on a closed watch returns 21 (SQLITE_MISUSE) with the line
