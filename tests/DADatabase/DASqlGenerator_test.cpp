@@ -250,8 +250,8 @@ const SqlCase kCases[] = {
      "SELECT  * FROM contacts INNER JOIN groups ON contacts.group_id = groups.id WHERE groups.title='Family' AND "
      "ts<1700000000000", TsBefore},
     {kUpsert, "t", {{kName, "Kim"}}, {}, "INSERT OR REPLACE INTO t (name) VALUES ('Kim')", TsBefore},  // ignored
-    {kQuery, "events", {}, {}, "SELECT * FROM events WHERE ts<1700000000000 ORDER BY ts DESC LIMIT 50",
-     [](DABaseSet& r) { TsBefore(r), Q(r).SetOrderBy("ts", true), Q(r).SetLimit(50); }},
+    {kQuery, "events", {}, {}, "SELECT * FROM events WHERE ts<1700000000000 ORDER BY events.ts DESC LIMIT 50",
+     [](DABaseSet& r) { TsBefore(r), Q(r).SetOrderBy("events.ts", true), Q(r).SetLimit(50); }},
     // Pages: a negative offset counts as 0, a negative count as no limit; sort keys are copied.
     {kQuery, "t", {}, {}, "SELECT * FROM t ORDER BY phone DESC, name, _ID DESC LIMIT 0 OFFSET 1", [](DABaseSet& r) {
         Q(r).SetOrderBy("phone", true), Q(r).SetOrderBy(std::string("name").c_str()), Q(r).SetOrderBy("_ID", true);

@@ -136,13 +136,14 @@ TEST_F(WatchTest, BurstDropAndUnwatch)
     DAWatch watch;
     const LogCapture quiet;
     ASSERT_EQ(0, OpenWatch(watch) + watch.AddTable("contacts") + watch.AddTable("groups"));
+    EXPECT_EQ("ulo_db-watch/contacts/delete;ulo_db-watch/contacts/insert;ulo_db-watch/contacts/update",
+              raw.Query("SELECT name FROM sqlite_master WHERE type = 'trigger' AND tbl_name = 'contacts' ORDER BY 1"));
     DASession session;
     session.SetSyncOnCommit(false);
     ASSERT_EQ(0, session.Open(m_location));
     for (int i = 0; i < 10000; ++i) {
         DAUpsertRequest row;
-        row.SetTable("contacts");
-        row.SetData("name", i);
+        At(row, Dir(), "contacts").SetData("name", i);
         ASSERT_EQ(0, session.Upsert(row));
     }
     Strings changed;
@@ -156,8 +157,7 @@ TEST_F(WatchTest, BurstDropAndUnwatch)
     raw.Run("INSERT INTO groups(title) VALUES('Gym')");
     EXPECT_EQ(0, watch.Check(changed));
     EXPECT_EQ(Strings{"groups"}, changed);
-    DABasePath location;
-    EXPECT_EQ(0, session.Unwatch("contacts") + DADatabase().Unwatch(At(location, Dir()), "groups"));
+    EXPECT_EQ(0, session.Unwatch("contacts") + DADatabase().Unwatch(m_location, "groups"));
     EXPECT_EQ(schema, raw.Query("SELECT * FROM sqlite_master ORDER BY name"));
     EXPECT_EQ(0, watch.Check(changed));
     EXPECT_EQ((Strings{"contacts", "groups"}), changed);
