@@ -288,6 +288,8 @@ TEST_P(TypedValues, QueryEachMemoryDoesNotGrowWithTheRows)
              "INSERT INTO m SELECT i, i % 50, 'user' || (i % 97), printf('%060d', i), 1700000000000 + i, i % 4 "
              "FROM n;");
     Open();
+    // The heap in use less SQLite's own; blocks large enough to be mapped on their own count too.
+    const auto heap = [] { return std::int64_t(mallinfo2().uordblks + mallinfo2().hblkhd) - sqlite3_memory_used(); };
     const auto peak = [&](int rows) {
         DAQueryRequest query;
         At(query, Dir(), "m").SetLimit(rows);
@@ -295,8 +297,7 @@ TEST_P(TypedValues, QueryEachMemoryDoesNotGrowWithTheRows)
         std::string body;
         EXPECT_EQ(0, ON(QueryEach, query, [&](DARow const& row) {
                       row.GetString(3, body);
-                      const std::int64_t heap = static_cast<std::int64_t>(mallinfo2().uordblks);
-                      most = std::max(most, heap - static_cast<std::int64_t>(sqlite3_memory_used()));
+                      most = std::max<std::int64_t>(most, heap());
                       return true;
                   }));
         return most;
@@ -309,8 +310,6 @@ TEST_P(TypedValues, QueryEachMemoryDoesNotGrowWithTheRows)
     At(ids, Dir(), "m").AddColumn("id");
     ids.SetLimit(65537);
     DATypedCursor cursor;
-    // Blocks large enough to be mapped on their own count too.
-    const auto heap = [] { return std::int64_t(mallinfo2().uordblks + mallinfo2().hblkhd) - sqlite3_memory_used(); };
     const std::int64_t before = heap();
     ASSERT_EQ(0, ON(Query, ids, cursor));
     EXPECT_LT(heap() - before, 65537 * 9 + (64 << 10));
