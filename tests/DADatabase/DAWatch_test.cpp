@@ -126,18 +126,27 @@ TEST_F(WatchTest, SeesEveryWriteOfAnotherProcessAndNothingElse)
     EXPECT_EQ(threads, Threads());
 }
 
-// A burst written while nobody waits is reported once by the next Check; a
-// dropped and created table stays watched; Unwatch (by a session and per
-// call) leaves the schema as before AddTable and ends the watch's interest.
+// A burst written while nobody waits is reported once by the next Check,
+// and to a second watch too; triggers of an earlier release (counting every
+// row) are replaced; a dropped and created table stays watched; Unwatch (by
+// a session and per call) leaves the schema as before and ends the watch's
+// interest.
 TEST_F(WatchTest, BurstDropAndUnwatch)
 {
     RawDb raw(PathOf("t.db"));
     const std::string schema = raw.Query("SELECT * FROM sqlite_master ORDER BY name");
+    raw.Run(
+        "CREATE TABLE \"ulo_db-watch\"(name TEXT PRIMARY KEY COLLATE NOCASE, changes INTEGER NOT NULL) WITHOUT "
+        "ROWID; INSERT INTO \"ulo_db-watch\" VALUES('groups', 3); CREATE TRIGGER \"ulo_db-watch/groups/insert\" "
+        "AFTER INSERT ON groups BEGIN UPDATE \"ulo_db-watch\" SET changes = changes + 1 WHERE name = 'groups'; END");
     DAWatch watch;
+    DAWatch other;
     const LogCapture quiet;
     ASSERT_EQ(0, OpenWatch(watch) + watch.AddTable("contacts") + watch.AddTable("groups"));
+    ASSERT_EQ(0, OpenWatch(other) + other.AddTable("contacts"));
     EXPECT_EQ("ulo_db-watch/contacts/delete;ulo_db-watch/contacts/insert;ulo_db-watch/contacts/update",
               raw.Query("SELECT name FROM sqlite_master WHERE type = 'trigger' AND tbl_name = 'contacts' ORDER BY 1"));
+    EXPECT_EQ("6", raw.Query("SELECT count(*) FROM sqlite_master WHERE sql LIKE '%AND changes = seen; END'"));
     DASession session;
     session.SetSyncOnCommit(false);
     ASSERT_EQ(0, session.Open(m_location));
@@ -151,6 +160,11 @@ TEST_F(WatchTest, BurstDropAndUnwatch)
     EXPECT_EQ(Strings{"contacts"}, changed);
     EXPECT_EQ(0, watch.Check(changed));
     EXPECT_EQ(Strings{}, changed);
+    raw.Run("INSERT INTO contacts(name) VALUES('Lee')");
+    EXPECT_EQ(0, other.Check(changed));
+    EXPECT_EQ(Strings{"contacts"}, changed);
+    EXPECT_EQ(0, watch.Check(changed));
+    EXPECT_EQ(Strings{"contacts"}, changed);
     raw.Run("DROP TABLE groups; CREATE TABLE groups(_ID INTEGER PRIMARY KEY, title TEXT)");
     EXPECT_EQ(0, watch.Check(changed));
     EXPECT_EQ(Strings{"groups"}, changed);

@@ -14,16 +14,22 @@ struct DAWatchState;
 /// SQLite program, in write-ahead-log or rollback-journal mode.
 ///
 /// What watching adds to the file: a table "ulo_db-watch" (name TEXT
-/// PRIMARY KEY COLLATE NOCASE, changes INTEGER) WITHOUT ROWID, holding one
-/// counter per watched table, and per watched table T three triggers
-/// "ulo_db-watch/T/insert", "ulo_db-watch/T/update", "ulo_db-watch/T/delete"
-/// (AFTER INSERT, UPDATE, DELETE ON T) that add 1 to T's counter for every
-/// row a statement touches, in the writer's own transaction. The first
-/// watch of a table creates them under the write lock, whichever watch
-/// (of whichever process) comes first; they stay when watches close, so
-/// every writer keeps counting, and are removed only by DADatabase::Unwatch
-/// (or DASession::Unwatch). A write to a watched table costs one counter
-/// update per row.
+/// PRIMARY KEY COLLATE NOCASE, changes INTEGER NOT NULL, seen INTEGER NOT
+/// NULL DEFAULT 0) WITHOUT ROWID, holding per watched table a counter and
+/// the value of it a watch last saw, and per watched table T three
+/// triggers "ulo_db-watch/T/insert", "ulo_db-watch/T/update",
+/// "ulo_db-watch/T/delete" (AFTER INSERT, UPDATE, DELETE ON T) that add 1
+/// to T's counter, in the writer's own transaction, when it equals its
+/// seen value. A Check that finds a counter above its seen value marks it
+/// seen (a short write of its own). So the first commit to a table after a
+/// Check writes its counter, and the ones after it, until a watch looks
+/// again, only read it: a burst of writes costs one counter write. The
+/// first watch of a table creates them under the write lock, whichever
+/// watch (of whichever process) comes first; they stay when watches close,
+/// so every writer keeps marking, and are removed only by
+/// DADatabase::Unwatch (or DASession::Unwatch). A file watched by an
+/// earlier build (triggers counting every row, no seen) is brought to this
+/// form by the next AddTable; watches of both builds may not share a file.
 ///
 /// Waking: GetFd is an inotify descriptor on the file, its log and its
 /// folder, readable when a commit may have changed a watched table; put it
@@ -53,9 +59,9 @@ struct DAWatchState;
 /// A watching process needs write access to the file and its folder, as
 /// every writer does: AddTable writes (or confirms) the triggers in a write
 /// transaction, and Check waits out a commit by taking the write lock for
-/// an instant. A process that may only read the file (a group member of a
-/// 0640 file) gets 8 (SQLITE_READONLY) from AddTable, and so watches
-/// nothing.
+/// an instant and marks the counters it saw. That mark wakes every watch of
+/// the file once more (this one too); their Checks report nothing. A process that may only read the file (a group
+/// member of a 0640 file) gets 8 (SQLITE_READONLY) from AddTable, and so watches nothing.
 ///
 /// One DAWatch is used by one thread at a time; any number of watches, in
 /// one or several processes, may watch one file. Not copyable. Every

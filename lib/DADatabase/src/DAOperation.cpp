@@ -284,6 +284,32 @@ bool IsWatchableName(DAConnectionSource& source, char const* table, const char* 
     return false;
 }
 
+// Gives the watch counters of db a "seen" column if they have none (a new
+// table, or one of an earlier build, whose triggers counted every row) and
+// makes the watch triggers already there anew: the old ones would write
+// the counter at every commit.
+int GateCounters(DAConnectionSource& source, sqlite3* db, DAErrorText& error)
+{
+    const std::string table = kDAWatchTable;
+    const std::string gated = "SELECT count(*) FROM pragma_table_info('" + table + "') WHERE name = 'seen'";
+    std::array<std::int64_t, 1> count{};
+    int rc = ReadIntegers(source, db, gated.c_str(), count, error);
+    if (rc != SQLITE_OK || count[0] != 0) {
+        return rc;
+    }
+    std::string sql = "ALTER TABLE \"" + table + "\" ADD COLUMN seen INTEGER NOT NULL DEFAULT 0;";
+    const std::string watched =
+        "SELECT DISTINCT tbl_name FROM sqlite_master WHERE type = 'trigger' AND name LIKE '" + table + "/%'";
+    rc = ExecWhileBusy(
+        source, db, watched.c_str(), error,
+        [](void* user, int /*columns*/, char** texts, char** /*names*/) {
+            *static_cast<std::string*>(user) += DAWatchTriggers(texts[0], true);
+            return 0;
+        },
+        &sql);
+    return rc != SQLITE_OK ? rc : ExecWhileBusy(source, db, sql.c_str(), error);
+}
+
 // Appends sql and its terminating NUL to texts (the form RunTransaction
 // takes).
 void AddText(std::string& texts, const std::string& sql)
@@ -691,18 +717,16 @@ int DAOperations::Watch(DAConnectionSource& source, DABasePath& location, char c
     AddText(texts,
             "CREATE TABLE IF NOT EXISTS " + counters +
                 "(name TEXT PRIMARY KEY COLLATE NOCASE, changes INTEGER NOT NULL) WITHOUT ROWID");
-    AddText(texts, "INSERT OR IGNORE INTO " + counters + " VALUES(" + name + ", 0)");
-    for (const char* event : kDAWatchEvents) {
-        std::string trigger = "CREATE TRIGGER IF NOT EXISTS \"" + DAWatchTrigger(table, event);
-        trigger.append("\" AFTER ").append(event).append(" ON ").append(table);
-        trigger.append(" BEGIN UPDATE ").append(counters).append(" SET changes = changes + 1 WHERE name = ");
-        AddText(texts, trigger.append(name).append("; END"));
-    }
+    AddText(texts, "INSERT OR IGNORE INTO " + counters + "(name, changes) VALUES(" + name + ", 0)");
+    const std::string install =
+        DAWatchTriggers(table, false) + "UPDATE " + counters + " SET seen = changes WHERE name = " + name;
     const std::string read =
         "SELECT changes, (SELECT schema_version FROM pragma_schema_version) FROM " + counters + " WHERE name = " + name;
     std::array<std::int64_t, 2> values{};
-    const int rc = RunLoggedTransaction(source, location, func, texts, 5, [&](sqlite3* db, DAErrorText& error) {
-        return ReadIntegers(source, db, read.c_str(), values, error);
+    const int rc = RunLoggedTransaction(source, location, func, texts, 2, [&](sqlite3* db, DAErrorText& error) {
+        int result = GateCounters(source, db, error);
+        result = result != SQLITE_OK ? result : ExecWhileBusy(source, db, install.c_str(), error);
+        return result != SQLITE_OK ? result : ReadIntegers(source, db, read.c_str(), values, error);
     });
     if (rc == SQLITE_OK) {
         changes = values[0];

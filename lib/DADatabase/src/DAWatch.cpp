@@ -55,6 +55,7 @@ struct DAWatchState {
     std::string file;
     DAConnection db;  // declared before the statement, closed after it
     DAStatement counters;  // kept from Check to Check
+    DAStatement observe;  // marks every counter seen
     int fd = -1;
     int folderWatch = -1;
     std::vector<DAWatched> tables;  // sorted by name
@@ -65,6 +66,7 @@ struct DAWatchState {
     void Close()
     {
         counters.reset();
+        observe.reset();
         db.reset();
         if (fd >= 0) {
             close(fd);
@@ -231,35 +233,63 @@ int Inspect(DAWatchState& state, const char* func, int line, std::vector<std::st
     }
     DAErrorText error;
     int rc = SQLITE_OK;
-    if (state.pending) {
-        // The wake-up may precede the commit's publication (a log's last
-        // write comes before its index is updated): the write lock, had for
-        // an instant, is had only once that commit has ended.
-        // Waiting for it is the normal case, not contention: no warning.
+    bool locked = false;
+    // The write lock is had only once the commit in progress has ended (a
+    // wake-up may precede the commit's publication: a log's last write comes
+    // before its index is updated), and marking counters seen needs it.
+    // Waiting for it is the normal case, not contention: no warning.
+    const auto lock = [&] {
         state.busy.SetQuiet(true);
         rc = source.Execute(state.db.get(), "BEGIN IMMEDIATE", error);
         state.busy.SetQuiet(false);
-        if (rc == SQLITE_OK) {
-            sqlite3_exec(state.db.get(), "COMMIT", nullptr, nullptr, nullptr);
-        }
+        locked = rc == SQLITE_OK;
+    };
+    if (state.pending) {
+        lock();
     }
     if (rc == SQLITE_OK && !state.counters) {
-        const std::string sql = std::string("SELECT s.schema_version, w.name, w.changes FROM pragma_schema_version AS "
-                                            "s LEFT JOIN \"") +
+        const std::string sql = std::string("SELECT s.schema_version, w.name, w.changes, w.seen FROM "
+                                            "pragma_schema_version AS s LEFT JOIN \"") +
             kDAWatchTable + "\" AS w";
         rc = source.PrepareKept(sql.c_str(), state.counters);
     }
     std::vector<std::pair<std::string, std::int64_t>> rows;
     std::int64_t schema = state.schema;
-    if (rc == SQLITE_OK) {
+    // A value is only taken as seen together with marking it so (the
+    // triggers count again only then), which needs the lock.
+    bool unseen = false;
+    while (rc == SQLITE_OK) {
+        rows.clear();
+        unseen = false;
         rc = source.Rows(state.counters.get(), [&](sqlite3_stmt* stmt) {
             schema = sqlite3_column_int64(stmt, 0);
             if (sqlite3_column_type(stmt, 1) != SQLITE_NULL) {
                 rows.emplace_back(Lower(reinterpret_cast<const char*>(sqlite3_column_text(stmt, 1))),
                                   sqlite3_column_int64(stmt, 2));
+                unseen = unseen || rows.back().second != sqlite3_column_int64(stmt, 3);
             }
         });
         rc = rc == SQLITE_DONE ? SQLITE_OK : rc;
+        if (rc != SQLITE_OK || !unseen || locked) {
+            break;
+        }
+        lock();
+    }
+    if (rc == SQLITE_OK && unseen && !state.observe) {
+        const std::string sql =
+            std::string("UPDATE \"") + kDAWatchTable + "\" SET seen = changes WHERE seen <> changes";
+        rc = source.PrepareKept(sql.c_str(), state.observe);
+    }
+    if (rc == SQLITE_OK && unseen) {
+        rc = source.Rows(state.observe.get(), [](sqlite3_stmt* /*stmt*/) {});
+        rc = rc == SQLITE_DONE ? SQLITE_OK : rc;
+    }
+    if (locked) {
+        const int end = rc == SQLITE_OK ? source.Execute(state.db.get(), "COMMIT", error) : rc;
+        if (end != SQLITE_OK) {
+            sqlite3_exec(state.db.get(), "ROLLBACK", nullptr, nullptr, nullptr);
+        }
+        rc = rc == SQLITE_OK ? end : rc;
     }
     if (rc == SQLITE_ERROR) {
         // No counter table: every watched table was unwatched.
@@ -342,6 +372,10 @@ int DAWatch::Open(DABasePath& location)
             schema = sqlite3_column_int64(stmt.get(), 0);
             rc = SQLITE_OK;
         }
+        // The watch writes only its marks of counters seen; one lost to a
+        // power cut makes the next watches report a change once more, so
+        // its commits need not wait for the disk.
+        sqlite3_exec(db.get(), "PRAGMA synchronous = NORMAL", nullptr, nullptr, nullptr);
     }
     if (rc != SQLITE_OK) {
         DA_LOG(DLOG_ERROR, "DB open failed. Error no(%d): %s", rc, db ? sqlite3_errmsg(db.get()) : sqlite3_errstr(rc));

@@ -3,8 +3,8 @@
 
 // What watching keeps in a file, named once: the table of change counters
 // (its name has a '-', which a plain name never has, so no application
-// table can be called so) and three triggers per watched table that count
-// every row inserted, updated or deleted.
+// table can be called so) and three triggers per watched table that mark
+// it changed.
 
 #include <string>
 
@@ -15,6 +15,24 @@ constexpr const char* const kDAWatchEvents[] = {"insert", "update", "delete"};
 inline std::string DAWatchTrigger(const std::string& table, const char* event)
 {
     return std::string(kDAWatchTable) + "/" + table + "/" + event;
+}
+
+// The statements that make table's three triggers (after dropping the ones
+// there when replace is set). A trigger adds 1 to the counter only when a
+// watch has seen its value (changes = seen), so a burst of commits between
+// two Checks writes the counter's page once, not once per commit or row.
+inline std::string DAWatchTriggers(const std::string& table, bool replace)
+{
+    std::string sql;
+    for (const char* event : kDAWatchEvents) {
+        const std::string name = "\"" + DAWatchTrigger(table, event) + "\"";
+        if (replace) {
+            sql += "DROP TRIGGER IF EXISTS " + name + ";";
+        }
+        sql += "CREATE TRIGGER IF NOT EXISTS " + name + " AFTER " + event + " ON " + table + " BEGIN UPDATE \"" +
+            kDAWatchTable + "\" SET changes = changes + 1 WHERE name = '" + table + "' AND changes = seen; END;";
+    }
+    return sql;
 }
 
 #endif  // DAWATCHSCHEMA_H
