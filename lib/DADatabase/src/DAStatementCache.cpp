@@ -1,6 +1,5 @@
 #include "DAStatementCache.h"
 
-#include <array>
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
@@ -25,25 +24,12 @@ bool StartsWithDml(const char* sql)
     return false;
 }
 
-constexpr std::size_t kByteValues = 256;
-
-// The value of each upper-case hex digit by byte, -1 for any other byte:
-// a 1 MiB blob is 2 M digits, each read through this table.
-std::array<signed char, kByteValues> HexDigits()
+// The value of an upper-case hex digit: '0'-'9' keep their low four bits,
+// 'A'-'F' (0x41-0x46) add 9 to theirs. Branch-free, so that the compiler
+// vectorizes the read of a 1 MiB blob's 2 M digits.
+unsigned HexValue(unsigned char digit)
 {
-    std::array<signed char, kByteValues> digits{};
-    for (std::size_t i = 0; i < kByteValues; ++i) {
-        const int b = static_cast<int>(i);
-        digits[i] = static_cast<signed char>(b >= '0' && b <= '9' ? b - '0' : b >= 'A' && b <= 'F' ? b - 'A' + 10 : -1);
-    }
-    return digits;
-}
-
-const std::array<signed char, kByteValues> kHexDigits = HexDigits();
-
-int HexDigit(char c)
-{
-    return kHexDigits[static_cast<unsigned char>(c)];
+    return (digit & 0xFU) + 9U * (digit >> 6U);
 }
 
 // Reads the blob literal X'..' at c into bytes; returns its end, or null
@@ -57,8 +43,10 @@ const char* ReadBlob(const char* c, std::string& bytes)
         return nullptr;
     }
     bytes.resize(count / 2);
-    for (std::size_t i = 0; i < bytes.size(); ++i) {
-        bytes[i] = static_cast<char>(HexDigit(digits[2 * i]) * 16 + HexDigit(digits[2 * i + 1]));
+    const auto* in = reinterpret_cast<const unsigned char*>(digits);
+    auto* out = reinterpret_cast<unsigned char*>(bytes.data());
+    for (std::size_t i = 0; i < count / 2; ++i) {
+        out[i] = static_cast<unsigned char>(HexValue(in[2 * i]) << 4U | HexValue(in[2 * i + 1]));
     }
     return end + 1;
 }
