@@ -1,5 +1,6 @@
 #include "DAWatch.h"
 
+#include <poll.h>
 #include <signal.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -160,6 +161,11 @@ TEST_F(WatchTest, BurstDropAndUnwatch)
     EXPECT_EQ(Strings{"contacts"}, changed);
     EXPECT_EQ(0, watch.Check(changed));
     EXPECT_EQ(Strings{}, changed);
+    DAUpsertRequest row;  // into the log the session keeps, which came after Open
+    At(row, Dir(), "contacts").SetData("name", "Ann");
+    ASSERT_EQ(0, session.Upsert(row));
+    pollfd woken{watch.GetFd(), POLLIN, 0};
+    EXPECT_EQ(1, poll(&woken, 1, 5000));
     raw.Run("INSERT INTO contacts(name) VALUES('Lee')");
     EXPECT_EQ(0, other.Check(changed));
     EXPECT_EQ(Strings{"contacts"}, changed);
