@@ -142,8 +142,10 @@ void bench::WatchCases(const Location& at)
     // checked: the watched writes with a Check (untimed) before each, so that each commit marks its counter.
     auto seen = std::make_shared<std::vector<std::string>>();
     const auto check = [watch, seen] { return watch->Check(*seen); };
-    Add("watch/write" + name + "checked", [w0] { return DADatabase().Upsert(*w0); }, {}, check);
-    Add("watch/sessionwrite" + name + "checked", [session, w0] { return session->Upsert(*w0); }, {}, check);
+    Add(
+        "watch/write" + name + "checked", [w0] { return DADatabase().Upsert(*w0); }, {}, check);
+    Add(
+        "watch/sessionwrite" + name + "checked", [session, w0] { return session->Upsert(*w0); }, {}, check);
     // check10: Check after a commit to one of 10 watched tables (the commit untimed).
     auto changed = std::make_shared<std::vector<std::string>>();
     Add(

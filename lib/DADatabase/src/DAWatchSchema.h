@@ -29,8 +29,9 @@ inline std::string DAWatchTriggers(const std::string& table, bool replace)
         if (replace) {
             sql += "DROP TRIGGER IF EXISTS " + name + ";";
         }
-        sql += "CREATE TRIGGER IF NOT EXISTS " + name + " AFTER " + event + " ON " + table + " BEGIN UPDATE \"" +
-            kDAWatchTable + "\" SET changes = changes + 1 WHERE name = '" + table + "' AND changes = seen; END;";
+        sql.append("CREATE TRIGGER IF NOT EXISTS ").append(name).append(" AFTER ").append(event);
+        sql.append(" ON ").append(table).append(" BEGIN UPDATE \"").append(kDAWatchTable);
+        sql.append("\" SET changes = changes + 1 WHERE name = '").append(table).append("' AND changes = seen; END;");
     }
     return sql;
 }
