@@ -60,8 +60,9 @@ struct DAWatchState;
 /// every writer does: AddTable writes (or confirms) the triggers in a write
 /// transaction, and Check waits out a commit by taking the write lock for
 /// an instant and marks the counters it saw. That mark wakes every watch of
-/// the file once more (this one too); their Checks report nothing. A process that may only read the file (a group
-/// member of a 0640 file) gets 8 (SQLITE_READONLY) from AddTable, and so watches nothing.
+/// the file once more (this one too); their Checks report nothing. A
+/// process that may only read the file (a group member of a 0640 file) gets
+/// 8 (SQLITE_READONLY) from AddTable, and so watches nothing.
 ///
 /// One DAWatch is used by one thread at a time; any number of watches, in
 /// one or several processes, may watch one file. Not copyable. Every
