@@ -1,7 +1,10 @@
 #include "DASqlGenerator.h"
 
+#include "DAStatementCache.h"
+
 #include <cstdint>
 #include <string>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
@@ -113,7 +116,9 @@ void Fill(DABasePath& /*location*/, const SqlCase& /*c*/)
 {
 }
 
-// The statement of c's request: a fresh request filled from c.
+// The statement of c's request: a fresh request filled from c. Its shape
+// and values, as a session binds them, must be what splitting the text
+// gives, and write the text back.
 template <typename Request, void (DASqlGenerator::*generate)(Request&, std::string&)>
 std::string Generated(const SqlCase& c)
 {
@@ -121,6 +126,20 @@ std::string Generated(const SqlCase& c)
     Fill(request, c);
     std::string out = "stale text that must disappear";
     (DASqlGenerator().*generate)(request, out);
+    if constexpr (!std::is_same_v<Request, DABasePath>) {
+        DASqlStatement shaped;
+        shaped.shaped = true;
+        shaped.sql = "stale";
+        DAWriteSql(request, shaped);
+        std::string shape;
+        DASqlParams values;
+        const bool splits = DASplitLiterals(out.c_str(), shape, values);
+        EXPECT_EQ(shaped.shaped ? shape : out, shaped.sql) << out;
+        EXPECT_EQ(shaped.shaped ? values.Bytes() : "", shaped.params.Bytes()) << out;
+        EXPECT_EQ(out, shaped.Text());
+        const bool search = std::is_same_v<Request, DASearchRequest>;
+        EXPECT_TRUE(shaped.shaped || !splits || search) << out;
+    }
     return out;
 }
 
@@ -325,6 +344,7 @@ const SqlCase kCases[] = {
     {kQuery, "t", {{kName, "n"}}, {{kPhone, "1"}}, "SELECT * FROM t WHERE a=1", [](DABaseSet& r) {
         Q(r).SetOrderBy("ts"), Q(r).SetLimit(5, 5), r.SetWhere("x", DACompare::Less, 3), Q(r).ClearOrderBy();
         Q(r).ClearLimit(), r.ClearWhere(), r.ClearData(), r.SetWhere("a", DACompare::Equal, 1); }},
+    {kUpdate, "t", {{kName, "a AND b"}}, {}, "UPDATE t SET name = 'a"},
     {kUpdate, "t", {{kName, "n"}}, {}, "UPDATE t SET name = 'm', phone = NULL WHERE ", [](DABaseSet& r) {
         r.SetNull(kPhone), r.ClearData(), r.SetData(kName, "m"), r.SetNull(kPhone); }},
 };

@@ -1,5 +1,7 @@
 #include "DAStatementCache.h"
 
+#include <cstdint>
+#include <cstring>
 #include <string>
 #include <vector>
 
@@ -52,14 +54,17 @@ TEST(DASplitLiterals, TakesOutTheLiteralsOfPlainDmlOnly)
     const char* const kMarks[] = {"", "#", "null", "x"};
     for (const SplitCase& c : kSplits) {
         std::string shape;
-        std::vector<DALiteral> values;
+        DASqlParams values;
         const bool split = DASplitLiterals(c.sql, shape, values);
         EXPECT_EQ(*c.shape != '\0', split) << c.sql;
         if (split) {
             std::vector<std::string> texts;
-            for (const DALiteral& value : values) {
-                texts.push_back(kMarks[static_cast<int>(value.kind)] + value.text);
-            }
+            values.View().ForEach([&](DAParamKind kind, const char* bytes, std::size_t size) {
+                std::int64_t integer = 0;
+                std::memcpy(&integer, bytes, sizeof integer);
+                texts.push_back(kMarks[static_cast<int>(kind)] +
+                                (kind == DAParamKind::Integer ? std::to_string(integer) : std::string(bytes, size)));
+            });
             EXPECT_EQ(c.shape, shape);
             EXPECT_EQ(c.values, texts);
         }
@@ -69,7 +74,7 @@ TEST(DASplitLiterals, TakesOutTheLiteralsOfPlainDmlOnly)
         in += ", '" + std::to_string(i) + "'";
     }
     std::string shape;
-    std::vector<DALiteral> values;
+    DASqlParams values;
     EXPECT_TRUE(DASplitLiterals((in + ")").c_str(), shape, values));
     EXPECT_FALSE(DASplitLiterals((in + ", '999')").c_str(), shape, values)) << "more literals than parameters";
 }
@@ -86,7 +91,7 @@ TEST(DAStatementCache, KeepsTheMostRecentlyUsedWithinItsCapacity)
             const std::string shape = "SELECT " + std::to_string(i);
             sqlite3_stmt* stmt = nullptr;
             ASSERT_EQ(SQLITE_OK, sqlite3_prepare_v2(db, shape.c_str(), -1, &stmt, nullptr));
-            cache.Put(shape, stmt);
+            cache.Put(stmt);
         }
         int open = 0;
         for (sqlite3_stmt* stmt = sqlite3_next_stmt(db, nullptr); stmt != nullptr; stmt = sqlite3_next_stmt(db, stmt)) {

@@ -23,11 +23,14 @@ struct DAOperations;
 /// all of them land, or none.
 ///
 /// The batch's own location (SetPath) is the file the statements run on.
-/// Add writes a request's statement at once, with the generator function
-/// the request's own operation uses, and keeps only the text: the request
-/// may be changed or destroyed afterwards. The texts are kept one after
-/// another in a single buffer, so a batch holds little more than the
-/// statements' own bytes.
+/// Add writes a request's statement at once, as the request's own
+/// operation writes it, and keeps only the statement: the request may be
+/// changed or destroyed afterwards. A write (upsert, update, delete,
+/// insert) is kept as its shape with its values beside it, which a
+/// session binds into the statement it keeps for that shape; elsewhere it
+/// runs as the very text DASqlGenerator gives. The statements are kept
+/// one after another in a single buffer, so a batch holds little more
+/// than the statements' own bytes.
 ///
 /// Location rule of Add: a request with no location at all runs at the
 /// batch's location. A request whose location is set (both parts) must
@@ -95,14 +98,15 @@ private:
     // count.
     friend struct DAOperations;
 
-    template <typename Request, typename Generate>
-    int AddStatement(Request& request, Generate generate);
+    template <typename Request>
+    int AddStatement(Request& request);
 
     // 0 when request may join the batch, else logs the refusal and
     // returns SQLITE_MISUSE.
     int CheckLocation(DABasePath& request);
 
-    // Every statement followed by its terminating NUL, in Add order.
+    // Every statement packed (its text, or its shape and values), in Add
+    // order.
     std::vector<char> m_texts;
     int m_count = 0;
     int m_changes = 0;

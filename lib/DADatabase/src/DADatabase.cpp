@@ -6,6 +6,7 @@
 #include "DAOperation.h"
 #include "DASqlGenerator.h"
 #include "DASqliteHandles.h"
+#include "DAStatementCache.h"
 
 namespace {
 
@@ -23,15 +24,32 @@ public:
         sqlite3* handle = nullptr;
         const int rc = m_database.OpenDB(handle, dir, file);
         lease = DALease(handle, DALeaseEnd{this});  // null when the open failed
+        if (m_keptFor == nullptr) {
+            m_keptFor = handle;
+        }
         return rc;
     }
 
-    void Release(sqlite3* db) noexcept override { sqlite3_close(db); }
+    void Release(sqlite3* db) noexcept override
+    {
+        if (db == m_keptFor) {
+            m_kept.Clear();
+            m_keptFor = nullptr;
+        }
+        sqlite3_close(db);
+    }
 
     bool IsRetryLimit(int& count) override { return m_database.IsRetryLimit(count); }
 
+protected:
+    // A batch's statements of one shape are prepared once, and kept until
+    // the operation's connection closes.
+    DAStatementCache* KeptStatements(sqlite3* db) override { return db == m_keptFor ? &m_kept : nullptr; }
+
 private:
     DADatabase& m_database;
+    DAStatementCache m_kept;
+    sqlite3* m_keptFor = nullptr;  // the connection m_kept holds statements of
 };
 
 }  // namespace

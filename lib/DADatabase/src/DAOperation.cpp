@@ -7,6 +7,7 @@
 #include <cstring>
 #include <stdexcept>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "DABusyRetry.h"
@@ -54,28 +55,56 @@ const char* FailureText(const DAErrorText& error, int rc)
     return error != nullptr ? error.get() : sqlite3_errstr(rc);
 }
 
+// Prepares or runs statement on db, as text or as shape and values.
+int PrepareStatement(DAConnectionSource& source, sqlite3* db, const DASqlView& statement, DAStatementLease& stmt)
+{
+    return statement.shaped ? source.PrepareShaped(db, statement.sql, statement.values, stmt)
+                            : source.Prepare(db, statement.sql, stmt);
+}
+
+int ExecuteStatement(DAConnectionSource& source, sqlite3* db, const DASqlView& statement, DAErrorText& error)
+{
+    return statement.shaped ? source.ExecuteShaped(db, statement.sql, statement.values, error)
+                            : source.Execute(db, statement.sql, error);
+}
+
+// A compaction's statement, always text.
+void DAWriteSql(DABasePath& location, DASqlStatement& statement)
+{
+    statement.shaped = false;
+    DASqlGenerator().GetCompactSql(location, statement.sql);
+}
+
+// The statement of request as db's source takes it: shape and values on
+// a held connection, else text.
+template <typename Request>
+void WriteFor(DAConnectionSource& source, sqlite3* db, Request& request, DASqlStatement& statement)
+{
+    statement.shaped = source.TakesShapes(db);
+    DAWriteSql(request, statement);
+}
+
 struct NoFollowUp {
     void operator()(sqlite3* /*db*/) const {}
 };
 
-// The write frame: acquire for writing, generate with the request's
-// generator function, exec under busy-retry; on success call done(db) while
-// the connection is still held (changes, row ids) and log "<word>
-// SUCCESS[0]", else "<word> FAILED[rc]: text", both under func.
+// The write frame: acquire for writing, write the request's statement,
+// exec under busy-retry; on success call done(db) while the connection is
+// still held (changes, row ids) and log "<word> SUCCESS[0]", else "<word>
+// FAILED[rc]: text", both under func.
 template <typename Request, typename Done = NoFollowUp>
-int RunWrite(DAConnectionSource& source, Request& request, void (DASqlGenerator::*generate)(Request&, std::string&),
-             const char* func, const char* word, Done done = Done())
+int RunWrite(DAConnectionSource& source, Request& request, const char* func, const char* word, Done done = Done())
 {
     DALease db;
     int rc = source.Acquire(request, DAAccess::Write, func, db);
     if (rc != SQLITE_OK) {
         return rc;
     }
-    std::string sql;
-    (DASqlGenerator().*generate)(request, sql);
+    DASqlStatement statement;
+    WriteFor(source, db.get(), request, statement);
 
     DAErrorText error;
-    rc = source.Execute(db.get(), sql.c_str(), error);
+    rc = ExecuteStatement(source, db.get(), statement.View(), error);
     if (rc == SQLITE_OK) {
         done(db.get());
         DA_LOG_WHERE(DLOG_INFO, source.File(), func, source.Line(), "%s SUCCESS[%d]", word, rc);
@@ -86,7 +115,8 @@ int RunWrite(DAConnectionSource& source, Request& request, void (DASqlGenerator:
     return rc;
 }
 
-// The query frame: acquire for reading, generate, prepare under busy-retry,
+// The query frame: acquire for reading, generate(db, statement), prepare
+// under busy-retry,
 // and on success return parse(parser, db, stmt, mayBeStale); on failure log
 // "<word> FAILED[rc]: text" under func and return the preparation's code.
 // A statement the source kept from before a schema change it cannot follow
@@ -106,19 +136,19 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
         }
         return openRc;
     }
-    std::string sql;
-    generate(sql);
+    DASqlStatement statement;
+    generate(db.get(), statement);
 
     DAStatementLease stmt;
     DADatabaseParser parser;
-    int rc = source.Prepare(db.get(), sql.c_str(), stmt);
+    int rc = PrepareStatement(source, db.get(), statement.View(), stmt);
     if (rc == SQLITE_OK) {
         rc = parse(parser, db.get(), stmt.get(), source.MayBeStale());
         if (rc != kDAStaleStatement) {
             return rc;
         }
         stmt.reset();
-        rc = source.DAConnectionSource::Prepare(db.get(), sql.c_str(), stmt);
+        rc = source.DAConnectionSource::Prepare(db.get(), statement.Text().c_str(), stmt);
         if (rc == SQLITE_OK) {
             return parse(parser, db.get(), stmt.get(), false);
         }
@@ -133,11 +163,11 @@ int RunQuery(DAConnectionSource& source, DABasePath& location, Generate generate
 // parser, and returned (with the line "<word> FAILED[rc]: text") when
 // returnStepFailure.
 template <typename Request, typename Rows>
-int RunRowsQuery(DAConnectionSource& source, Request& request, void (DASqlGenerator::*generate)(Request&, std::string&),
-                 const char* func, const char* word, bool logOpenFailure, bool returnStepFailure, Rows rows)
+int RunRowsQuery(DAConnectionSource& source, Request& request, const char* func, const char* word, bool logOpenFailure,
+                 bool returnStepFailure, Rows rows)
 {
     return RunQuery(
-        source, request, [&](std::string& sql) { (DASqlGenerator().*generate)(request, sql); },
+        source, request, [&](sqlite3* db, DASqlStatement& statement) { WriteFor(source, db, request, statement); },
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, bool mayBeStale) {
             std::string failure;
             const int rc = rows(parser, db, stmt, failure, mayBeStale);
@@ -155,11 +185,10 @@ int RunRowsQuery(DAConnectionSource& source, Request& request, void (DASqlGenera
 
 // A query whose rows fill cursor.
 template <typename Request>
-int RunCursorQuery(DAConnectionSource& source, Request& request,
-                   void (DASqlGenerator::*generate)(Request&, std::string&), DACursor& cursor, const char* func,
-                   const char* word, bool logOpenFailure, bool returnStepFailure = false)
+int RunCursorQuery(DAConnectionSource& source, Request& request, DACursor& cursor, const char* func, const char* word,
+                   bool logOpenFailure, bool returnStepFailure = false)
 {
-    return RunRowsQuery(source, request, generate, func, word, logOpenFailure, returnStepFailure,
+    return RunRowsQuery(source, request, func, word, logOpenFailure, returnStepFailure,
                         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure,
                             bool mayBeStale) { return DAParseRows(parser, db, stmt, cursor, failure, mayBeStale); });
 }
@@ -185,19 +214,19 @@ int VisitRow(void* user, sqlite3_stmt* stmt)
 
 // The transaction core of batches and migrations, on a held connection:
 // "BEGIN IMMEDIATE", then decide() under the write lock (any code but 0
-// stops there), the count statements of texts (NUL-separated) in order,
-// finish() still inside the transaction, and "COMMIT"; every exec under
-// busy-retry. On a failure or a stop, rolls back and returns that code,
-// with step where it stopped (0 the begin or decide, 1..count the
-// statements, count + 1 finish or the commit) and error the text of a
-// failed exec.
+// stops there), the count statements packed at statements
+// (DAPackStatement) in order, finish() still inside the transaction, and
+// "COMMIT"; every exec under busy-retry. On a failure or a stop, rolls
+// back and returns that code, with step where it stopped (0 the begin or
+// decide, 1..count the statements, count + 1 finish or the commit) and
+// error the text of a failed exec.
 struct NoStatementFollowUp {
     void operator()(int /*step*/) const {}
 };
 
 template <typename Decide, typename Finish, typename After = NoStatementFollowUp>
-int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, int count, DAErrorText& error, int& step,
-                   Decide decide, Finish finish, After after = After())
+int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* statements, int count, DAErrorText& error,
+                   int& step, Decide decide, Finish finish, After after = After())
 {
     const DARollbackGuard rollback(db);
     // IMMEDIATE takes the write lock now, so a busy file shows (and is
@@ -207,14 +236,13 @@ int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* texts, i
     if (rc == SQLITE_OK) {
         rc = decide();
     }
-    const char* sql = texts;
+    const char* at = statements;
     while (rc == SQLITE_OK && step < count) {
         ++step;
-        rc = source.Execute(db, sql, error);
+        rc = ExecuteStatement(source, db, DAUnpackStatement(at, at), error);
         if (rc == SQLITE_OK) {
             after(step);
         }
-        sql += std::strlen(sql) + 1;
     }
     if (rc == SQLITE_OK) {
         step = count + 1;
@@ -310,25 +338,25 @@ int GateCounters(DAConnectionSource& source, sqlite3* db, DAErrorText& error)
     return rc != SQLITE_OK ? rc : ExecWhileBusy(source, db, sql.c_str(), error);
 }
 
-// Appends sql and its terminating NUL to texts (the form RunTransaction
-// takes).
-void AddText(std::string& texts, const std::string& sql)
+// Appends sql to texts, packed as RunTransaction takes it.
+void AddText(std::vector<char>& texts, const std::string& sql)
 {
-    texts += sql;
-    texts += '\0';
+    DASqlStatement statement;
+    statement.sql = sql;
+    DAPackStatement(statement, texts);
 }
 
 struct NoFinish {
     int operator()(sqlite3* /*db*/, DAErrorText& /*error*/) const { return SQLITE_OK; }
 };
 
-// Statements that land together or not at all: the count NUL-separated
-// texts (a text may hold several statements) and finish(db, error) in one
+// Statements that land together or not at all: the count texts of AddText
+// (a text may hold several statements) and finish(db, error) in one
 // transaction on a connection for writing, logged "<func> SUCCESS[0]" or
 // "<func> FAILED[rc]: text" under func, as the write frame logs.
 template <typename Finish = NoFinish>
-int RunLoggedTransaction(DAConnectionSource& source, DABasePath& location, const char* func, const std::string& texts,
-                         int count, Finish finish = Finish())
+int RunLoggedTransaction(DAConnectionSource& source, DABasePath& location, const char* func,
+                         const std::vector<char>& texts, int count, Finish finish = Finish())
 {
     DALease db;
     int rc = source.Acquire(location, DAAccess::Write, func, db);
@@ -364,23 +392,56 @@ int DAConnectionSource::Prepare(sqlite3* db, const char* sql, DAStatementLease& 
 int DAConnectionSource::Execute(sqlite3* db, const char* sql, DAErrorText& error)
 {
     std::string shape;
-    std::vector<DALiteral> values;
-    const auto isBlob = [](const DALiteral& value) { return value.kind == DALiteral::Kind::Blob; };
-    if (std::strstr(sql, "X'") != nullptr && DASplitLiterals(sql, shape, values) &&
-        std::any_of(values.begin(), values.end(), isBlob)) {
-        DAStatement stmt;
-        const int rc = DARetryWhileBusy(*this, [&] {
-            sqlite3_stmt* handle = nullptr;
-            const int result = sqlite3_prepare_v2(db, shape.c_str(), -1, &handle, nullptr);
-            stmt.reset(handle);
-            return result;
+    DASqlParams values;
+    bool blob = false;
+    if (std::strstr(sql, "X'") != nullptr && DASplitLiterals(sql, shape, values)) {
+        values.View().ForEach([&](DAParamKind kind, const char* /*bytes*/, std::size_t /*size*/) {
+            blob = blob || kind == DAParamKind::Blob;
         });
-        // A shape SQLite refuses runs as written, and fails as it would.
-        if (rc == SQLITE_OK) {
-            return StepToEnd(db, stmt.get(), DABindLiterals(stmt.get(), values), error);
-        }
     }
-    return ExecWhileBusy(*this, db, sql, error);
+    return blob ? ExecuteShaped(db, shape.c_str(), values.View(), error) : ExecWhileBusy(*this, db, sql, error);
+}
+
+int DAConnectionSource::PrepareShape(sqlite3* db, const char* shape, DASqlParamsView values, DAStatementLease& stmt)
+{
+    DAStatementCache* kept = KeptStatements(db);
+    sqlite3_stmt* handle = kept != nullptr ? kept->Take(shape) : nullptr;
+    int rc = SQLITE_OK;
+    if (handle == nullptr) {
+        // A failed preparation leaves handle null.
+        rc = DARetryWhileBusy(*this, [&] { return sqlite3_prepare_v2(db, shape, -1, &handle, nullptr); });
+    }
+    m_kept = kept != nullptr ? handle : nullptr;
+    stmt = DAStatementLease(handle, DAStatementEnd{this});
+    if (rc != SQLITE_OK) {
+        return rc == SQLITE_BUSY || rc == SQLITE_NOMEM ? rc : kAsWritten;
+    }
+    // The values outlive the statement's use: the cache clears the
+    // bindings when it takes the statement back.
+    return values.Bind(handle);
+}
+
+int DAConnectionSource::PrepareShaped(sqlite3* db, const char* shape, DASqlParamsView values, DAStatementLease& stmt)
+{
+    const int rc = PrepareShape(db, shape, values, stmt);
+    if (rc != kAsWritten) {
+        return rc;
+    }
+    std::string text;
+    values.Render(shape, text);
+    return DAConnectionSource::Prepare(db, text.c_str(), stmt);
+}
+
+int DAConnectionSource::ExecuteShaped(sqlite3* db, const char* shape, DASqlParamsView values, DAErrorText& error)
+{
+    DAStatementLease stmt;
+    const int rc = PrepareShape(db, shape, values, stmt);
+    if (rc != kAsWritten) {
+        return StepToEnd(db, rc == SQLITE_OK ? stmt.get() : nullptr, rc, error);
+    }
+    std::string text;
+    values.Render(shape, text);
+    return ExecWhileBusy(*this, db, text.c_str(), error);
 }
 
 int DAConnectionSource::StepToEnd(sqlite3* db, sqlite3_stmt* stmt, int rc, DAErrorText& error)
@@ -404,32 +465,36 @@ int DAConnectionSource::StepToEnd(sqlite3* db, sqlite3_stmt* stmt, int rc, DAErr
 
 void DAConnectionSource::Finish(sqlite3_stmt* stmt) noexcept
 {
-    sqlite3_finalize(stmt);
+    if (stmt == std::exchange(m_kept, nullptr)) {
+        KeptStatements(sqlite3_db_handle(stmt))->Put(stmt);
+    } else {
+        sqlite3_finalize(stmt);
+    }
 }
 
 int DAOperations::DropTable(DAConnectionSource& source, DADropRequest& request)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetDropTableSql, "DropTable", "DropTable");
+    return RunWrite(source, request, "DropTable", "DropTable");
 }
 
 int DAOperations::Update(DAConnectionSource& source, DAUpdateRequest& request)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetUpdateSql, "Update", "update");
+    return RunWrite(source, request, "Update", "update");
 }
 
 int DAOperations::Delete(DAConnectionSource& source, DADeleteRequest& request)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetDeleteSql, "Delete", "delete");
+    return RunWrite(source, request, "Delete", "delete");
 }
 
 int DAOperations::Upsert(DAConnectionSource& source, DAUpsertRequest& request)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetUpsertSql, "Upsert", "Upsert");
+    return RunWrite(source, request, "Upsert", "Upsert");
 }
 
 int DAOperations::CreateTable(DAConnectionSource& source, DACreateRequest& request)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetCreateTableSql, "CreateTable", "createTable");
+    return RunWrite(source, request, "CreateTable", "createTable");
 }
 
 int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch)
@@ -482,31 +547,30 @@ int DAOperations::ExecuteBatch(DAConnectionSource& source, DABatchRequest& batch
 
 int DAOperations::Select(DAConnectionSource& source, DASelectRequest& request, DACursor& cursor)
 {
-    return RunCursorQuery(source, request, &DASqlGenerator::GetSelectSql, cursor, "Select", "SELECT", true);
+    return RunCursorQuery(source, request, cursor, "Select", "SELECT", true);
 }
 
 int DAOperations::JoinSelect(DAConnectionSource& source, DAJoinRequest& request, DACursor& cursor)
 {
-    return RunCursorQuery(source, request, &DASqlGenerator::GetJoinSql, cursor, "JoinSelect", "JoinSelect", false);
+    return RunCursorQuery(source, request, cursor, "JoinSelect", "JoinSelect", false);
 }
 
 int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DACursor& cursor)
 {
-    return RunCursorQuery(source, request, &DASqlGenerator::GetQuerySql, cursor, "Query", "QUERY", true, true);
+    return RunCursorQuery(source, request, cursor, "Query", "QUERY", true, true);
 }
 
 int DAOperations::Query(DAConnectionSource& source, DAQueryRequest& request, DATypedCursor& cursor)
 {
-    return TypedQuery(source, request, &DASqlGenerator::GetQuerySql, cursor, "Query", "QUERY");
+    return TypedQuery(source, request, cursor, "Query", "QUERY");
 }
 
 template <typename Request>
-int DAOperations::TypedQuery(DAConnectionSource& source, Request& request,
-                             void (DASqlGenerator::*generate)(Request&, std::string&), DATypedCursor& cursor,
-                             const char* func, const char* word)
+int DAOperations::TypedQuery(DAConnectionSource& source, Request& request, DATypedCursor& cursor, const char* func,
+                             const char* word)
 {
     return RunRowsQuery(
-        source, request, generate, func, word, true, true,
+        source, request, func, word, true, true,
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, bool mayBeStale) {
             if (cursor.m_store == nullptr) {  // moved from
                 cursor.m_store = std::make_unique<DATypedStore>();
@@ -526,7 +590,7 @@ int DAOperations::QueryEach(DAConnectionSource& source, DAQueryRequest& request,
                             const std::function<bool(DARow const&)>& visit)
 {
     return RunRowsQuery(
-        source, request, &DASqlGenerator::GetQuerySql, "QueryEach", "QUERY", true, true,
+        source, request, "QueryEach", "QUERY", true, true,
         [&](DADatabaseParser& parser, sqlite3* db, sqlite3_stmt* stmt, std::string& failure, bool mayBeStale) {
             DATypedStore store;
             EachRow each{store, visit};
@@ -539,13 +603,13 @@ int DAOperations::CheckExistTable(DAConnectionSource& source, DABasePath& locati
 {
     return RunQuery(
         source, location,
-        [&](std::string& sql) {
+        [&](sqlite3* /*db*/, DASqlStatement& statement) {
             // Thrown explicitly (a std::string from null is undefined); the
             // lease closes the file on the way out.
             if (tableName == nullptr) {
                 throw std::logic_error("DADatabase::CheckExistTable: the table name is null");
             }
-            DASqlGenerator().GetCheckTableSql(tableName, sql);
+            DASqlGenerator().GetCheckTableSql(tableName, statement.sql);
         },
         [&](DADatabaseParser& parser, sqlite3* /*db*/, sqlite3_stmt* stmt, bool /*mayBeStale*/) {
             parser.ParseExistTable(stmt, exists);
@@ -556,12 +620,12 @@ int DAOperations::CheckExistTable(DAConnectionSource& source, DABasePath& locati
 
 int DAOperations::CreateIndex(DAConnectionSource& source, DACreateIndexRequest& request)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetCreateIndexSql, "CreateIndex", "CreateIndex");
+    return RunWrite(source, request, "CreateIndex", "CreateIndex");
 }
 
 int DAOperations::AddColumn(DAConnectionSource& source, DAAddColumnRequest& request)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetAddColumnSql, "AddColumn", "AddColumn");
+    return RunWrite(source, request, "AddColumn", "AddColumn");
 }
 
 int DAOperations::GetVersion(DAConnectionSource& source, DABasePath& location, int& version)
@@ -650,34 +714,34 @@ int DAOperations::GetSpace(DAConnectionSource& source, DABasePath& location, std
 
 int DAOperations::Compact(DAConnectionSource& source, DABasePath& location)
 {
-    return RunWrite(source, location, &DASqlGenerator::GetCompactSql, "Compact", "Compact");
+    return RunWrite(source, location, "Compact", "Compact");
 }
 
 int DAOperations::Insert(DAConnectionSource& source, DAInsertRequest& request, std::int64_t& rowId)
 {
     // An ignored row changes nothing, and then the last row id is another
     // statement's.
-    return RunWrite(source, request, &DASqlGenerator::GetInsertSql, "Insert", "Insert",
+    return RunWrite(source, request, "Insert", "Insert",
                     [&](sqlite3* db) { rowId = sqlite3_changes(db) > 0 ? sqlite3_last_insert_rowid(db) : -1; });
 }
 
 int DAOperations::Update(DAConnectionSource& source, DAUpdateRequest& request, int& changes)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetUpdateSql, "Update", "update",
-                    [&](sqlite3* db) { changes = sqlite3_changes(db); });
+    return RunWrite(source, request, "Update", "update", [&](sqlite3* db) { changes = sqlite3_changes(db); });
 }
 
 int DAOperations::Delete(DAConnectionSource& source, DADeleteRequest& request, int& changes)
 {
-    return RunWrite(source, request, &DASqlGenerator::GetDeleteSql, "Delete", "delete",
-                    [&](sqlite3* db) { changes = sqlite3_changes(db); });
+    return RunWrite(source, request, "Delete", "delete", [&](sqlite3* db) { changes = sqlite3_changes(db); });
 }
 
 int DAOperations::CreateSearchIndex(DAConnectionSource& source, DASearchIndexRequest& request)
 {
     std::string sql;
     DASqlGenerator().GetCreateSearchIndexSql(request, sql);
-    return RunLoggedTransaction(source, request, "CreateSearchIndex", sql, 1);
+    std::vector<char> texts;
+    AddText(texts, sql);
+    return RunLoggedTransaction(source, request, "CreateSearchIndex", texts, 1);
 }
 
 int DAOperations::DropSearchIndex(DAConnectionSource& source, DABasePath& location, char const* name)
@@ -690,17 +754,19 @@ int DAOperations::DropSearchIndex(DAConnectionSource& source, DABasePath& locati
     }
     std::string sql;
     DASqlGenerator().GetDropSearchIndexSql(name, sql);
-    return RunLoggedTransaction(source, location, func, sql, 1);
+    std::vector<char> texts;
+    AddText(texts, sql);
+    return RunLoggedTransaction(source, location, func, texts, 1);
 }
 
 int DAOperations::Search(DAConnectionSource& source, DASearchRequest& request, DACursor& cursor)
 {
-    return RunCursorQuery(source, request, &DASqlGenerator::GetSearchSql, cursor, "Search", "SEARCH", true, true);
+    return RunCursorQuery(source, request, cursor, "Search", "SEARCH", true, true);
 }
 
 int DAOperations::Search(DAConnectionSource& source, DASearchRequest& request, DATypedCursor& cursor)
 {
-    return TypedQuery(source, request, &DASqlGenerator::GetSearchSql, cursor, "Search", "SEARCH");
+    return TypedQuery(source, request, cursor, "Search", "SEARCH");
 }
 
 int DAOperations::Watch(DAConnectionSource& source, DABasePath& location, char const* table, std::int64_t& changes,
@@ -713,7 +779,7 @@ int DAOperations::Watch(DAConnectionSource& source, DABasePath& location, char c
     // Names are plain, so they need no quoting inside the literals.
     const std::string counters = std::string("\"") + kDAWatchTable + "\"";
     const std::string name = std::string("'") + table + "'";
-    std::string texts;
+    std::vector<char> texts;
     AddText(texts,
             "CREATE TABLE IF NOT EXISTS " + counters +
                 "(name TEXT PRIMARY KEY COLLATE NOCASE, changes INTEGER NOT NULL) WITHOUT ROWID");
@@ -742,7 +808,7 @@ int DAOperations::Unwatch(DAConnectionSource& source, DABasePath& location, char
         return SQLITE_MISUSE;
     }
     const std::string counters = std::string("\"") + kDAWatchTable + "\"";
-    std::string texts;
+    std::vector<char> texts;
     for (const char* event : kDAWatchEvents) {
         AddText(texts, "DROP TRIGGER IF EXISTS \"" + DAWatchTrigger(table, event) + "\"");
     }

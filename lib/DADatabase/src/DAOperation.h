@@ -30,12 +30,14 @@
 #include "DASearchIndexRequest.h"
 #include "DASearchRequest.h"
 #include "DASelectRequest.h"
+#include "DASqlStatement.h"
 #include "DASqliteHandles.h"
 #include "DATypedCursor.h"
 #include "DAUpdateRequest.h"
 #include "DAUpsertRequest.h"
 
 class DAConnectionSource;
+class DAStatementCache;
 class DASqlGenerator;
 
 // Ends a lease: a per-call visit closes the connection, a session takes it
@@ -99,8 +101,23 @@ public:
     // with sqlite3_exec.
     virtual int Execute(sqlite3* db, const char* sql, DAErrorText& error);
 
-    // Ends a statement Prepare handed out; here it is finalized.
-    virtual void Finish(sqlite3_stmt* stmt) noexcept;
+    // Whether statements on db may come as shapes with their values
+    // (PrepareShaped, ExecuteShaped): a session's held connections; here,
+    // no (a single statement runs as its text).
+    virtual bool TakesShapes(sqlite3* /*db*/) { return false; }
+
+    // Prepare and Execute of a statement given as its shape and values
+    // (DASqlStatement.h): the statement kept for the shape (KeptStatements)
+    // or one prepared now, with the values bound. A shape SQLite refuses
+    // (a literal where no parameter may stand) runs as its text instead,
+    // and fails, if it does, as it would anyway.
+    int PrepareShaped(sqlite3* db, const char* shape, DASqlParamsView values, DAStatementLease& stmt);
+    int ExecuteShaped(sqlite3* db, const char* shape, DASqlParamsView values, DAErrorText& error);
+
+    // Ends a statement Prepare handed out: kept for its shape when it came
+    // from KeptStatements, else finalized.    // Ends a statement Prepare handed out: kept for its shape when it came
+    // from KeptStatements, else finalized.
+    void Finish(sqlite3_stmt* stmt) noexcept;
 
     // Whether a statement Prepare hands out may have been prepared against
     // a schema that another connection has changed since: not here, where
@@ -108,14 +125,28 @@ public:
     virtual bool MayBeStale() const { return false; }
 
 protected:
+    // Where the statements of db are kept by shape between uses, if
+    // anywhere: a session keeps them with its connections, a per-call
+    // visit for the operation's connection while it lasts.
+    virtual DAStatementCache* KeptStatements(sqlite3* /*db*/) { return nullptr; }
+
     // Execute's end for a statement of sql's shape with its literals bound:
     // steps stmt to its end under busy-retry when rc is 0 (else stmt is
     // not used), and returns as Execute, SQLite's text in error.
     int StepToEnd(sqlite3* db, sqlite3_stmt* stmt, int rc, DAErrorText& error);
 
 private:
+    // PrepareShape's result when the shape is to run as its text.
+    static constexpr int kAsWritten = -1;
+
+    // The statement of shape on db, kept or prepared now (under
+    // busy-retry), with values bound: 0 with stmt set, or the failure's
+    // code; kAsWritten when SQLite does not take the shape.
+    int PrepareShape(sqlite3* db, const char* shape, DASqlParamsView values, DAStatementLease& stmt);
+
     const char* m_file;
     int m_line;
+    sqlite3_stmt* m_kept = nullptr;  // the kept statement handed out, to be put back
 };
 
 // Rolls back whatever transaction db still has open when it goes out of
@@ -179,9 +210,8 @@ struct DAOperations {
     // A query whose rows fill a typed cursor, in Query's frame, under func
     // and word: the typed Query and Search.
     template <typename Request>
-    static int TypedQuery(DAConnectionSource& source, Request& request,
-                          void (DASqlGenerator::*generate)(Request&, std::string&), DATypedCursor& cursor,
-                          const char* func, const char* word);
+    static int TypedQuery(DAConnectionSource& source, Request& request, DATypedCursor& cursor, const char* func,
+                          const char* word);
 
     // Installs, under the write lock, what watching table needs in the file
     // (DAWatchSchema.h; kept if there): 0 with changes and schema the

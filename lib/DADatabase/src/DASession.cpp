@@ -162,34 +162,19 @@ public:
     // and planned again. Any other text is prepared as it is.
     int Prepare(sqlite3* db, const char* sql, DAStatementLease& stmt) override
     {
-        DAStatementCache* cache = CacheOf(db);
-        const int rc =
-            cache != nullptr && DASplitLiterals(sql, m_shape, m_values) ? PrepareShape(db, *cache, stmt) : kAsWritten;
-        return rc != kAsWritten ? rc : DAConnectionSource::Prepare(db, sql, stmt);
+        return Split(db, sql) ? PrepareShaped(db, m_split.c_str(), m_values.View(), stmt)
+                              : DAConnectionSource::Prepare(db, sql, stmt);
     }
 
     // A text of a kept shape is stepped to its end as sqlite3_exec would
     // run it, with exec's code and SQLite's text.
     int Execute(sqlite3* db, const char* sql, DAErrorText& error) override
     {
-        DAStatementCache* cache = CacheOf(db);
-        DAStatementLease stmt;
-        int rc =
-            cache != nullptr && DASplitLiterals(sql, m_shape, m_values) ? PrepareShape(db, *cache, stmt) : kAsWritten;
-        if (rc == kAsWritten) {
-            return DAConnectionSource::Execute(db, sql, error);
-        }
-        return StepToEnd(db, rc == SQLITE_OK ? stmt.get() : nullptr, rc, error);
+        return Split(db, sql) ? ExecuteShaped(db, m_split.c_str(), m_values.View(), error)
+                              : DAConnectionSource::Execute(db, sql, error);
     }
 
-    void Finish(sqlite3_stmt* stmt) noexcept override
-    {
-        if (stmt == std::exchange(m_shaped, nullptr)) {
-            CacheOf(sqlite3_db_handle(stmt))->Put(m_shape, stmt);
-        } else {
-            sqlite3_finalize(stmt);
-        }
-    }
+    bool TakesShapes(sqlite3* db) override { return KeptStatements(db) != nullptr; }
 
     // Opens path with flags under busy-retry; on failure logs OpenDB's line
     // under func and leaves db empty.
@@ -237,48 +222,29 @@ public:
         return rc == SQLITE_DONE ? SQLITE_OK : rc;
     }
 
-private:
-    // PrepareShape's result when the text is to be prepared as it is.
-    static constexpr int kAsWritten = -1;
-
+protected:
     // The kept statements of db, if this source lent it.
-    DAStatementCache* CacheOf(sqlite3* db)
+    DAStatementCache* KeptStatements(sqlite3* db) override
     {
         return db == m_state.writer.get() ? &m_state.writerStatements
             : db == m_reader.db.get()     ? &m_reader.statements
                                           : nullptr;
     }
 
-    // The statement of m_shape on db, kept or prepared now (sqlite3_prepare_v2,
-    // under busy-retry), with m_values bound: 0 with stmt set, or the
-    // failure's code; kAsWritten when SQLite does not take the shape (a
-    // literal where no parameter may stand), so that the text runs as it is
-    // and fails, if it does, as it would anyway.
-    int PrepareShape(sqlite3* db, DAStatementCache& cache, DAStatementLease& stmt)
+private:
+    // Whether sql, on a connection of this source, splits into shape and
+    // values (m_split, m_values).
+    bool Split(sqlite3* db, const char* sql)
     {
-        sqlite3_stmt* handle = cache.Take(m_shape);
-        int rc = SQLITE_OK;
-        if (handle == nullptr) {
-            // A failed preparation leaves handle null.
-            rc = DARetryWhileBusy(*this, [&] { return sqlite3_prepare_v2(db, m_shape.c_str(), -1, &handle, nullptr); });
-        }
-        m_shaped = handle;
-        stmt = DAStatementLease(handle, DAStatementEnd{this});
-        if (rc != SQLITE_OK) {
-            return rc == SQLITE_BUSY || rc == SQLITE_NOMEM ? rc : kAsWritten;
-        }
-        // The values outlive the statement's use: the cache clears the
-        // bindings when it takes the statement back.
-        return DABindLiterals(handle, m_values);
+        return KeptStatements(db) != nullptr && DASplitLiterals(sql, m_split, m_values);
     }
 
     DASessionState& m_state;
     DAShortBusyWait m_busy;
     DAReader m_reader;  // the one this operation holds, if any
     std::string m_scratch[4];
-    std::string m_shape;  // the shape and literals of the last text split
-    std::vector<DALiteral> m_values;
-    sqlite3_stmt* m_shaped = nullptr;  // the statement of m_shape handed out
+    std::string m_split;  // the shape and values of the last text split
+    DASqlParams m_values;
 };
 
 // A session operation's source, holding the session's life lock shared for

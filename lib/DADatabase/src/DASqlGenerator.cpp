@@ -7,6 +7,8 @@
 #include <vector>
 
 #include "DASqlLiteral.h"
+#include "DASqlStatement.h"
+#include "DAStatementCache.h"
 
 namespace {
 
@@ -21,52 +23,92 @@ void CutAtLast(std::string& text, const char* separator)
     }
 }
 
-void AppendLiteral(std::string& sql, const std::string& value)
+// Whether out takes a value as a parameter: shaped, and with room for one
+// more (beyond the limit the whole statement is written as text again).
+bool TakesParam(DASqlStatement& out)
 {
-    DAAppendTextLiteral(sql, value);
+    if (out.shaped && out.params.Count() == kDAMaxParams) {
+        out.shaped = false;
+    }
+    return out.shaped;
+}
+
+// A text value: a literal in a text, a parameter in a shape.
+void AppendLiteral(DASqlStatement& out, const std::string& value)
+{
+    if (TakesParam(out)) {
+        out.sql += '?';
+        out.params.AddText(value);
+    } else {
+        DAAppendTextLiteral(out.sql, value);
+    }
+}
+
+// A piece of SQL that may hold values (a number, a DAValue's text): as it
+// is in a text, split in a shape.
+void AppendPiece(DASqlStatement& out, const std::string& piece)
+{
+    if (!out.shaped) {
+        out.sql += piece;
+    } else if (!DASplitAppend(piece.c_str(), out.sql, out.params)) {
+        out.shaped = false;
+    }
 }
 
 // A typed value of the data part as it stands in SQL: NULL, a blob, or an
 // increment's delta (its value on insert).
-void AppendTyped(std::string& sql, const DABaseSet::TypedValue& value)
+void AppendTyped(DASqlStatement& out, const DABaseSet::TypedValue& value)
 {
     if (value.increment) {
-        sql += std::to_string(value.delta);
-    } else if (value.null) {
-        sql += "NULL";
+        AppendPiece(out, std::to_string(value.delta));
+    } else if (!TakesParam(out)) {
+        if (value.null) {
+            out.sql += "NULL";
+        } else {
+            DAAppendBlobLiteral(out.sql, value.bytes.data(), value.bytes.size());
+        }
     } else {
-        DAAppendBlobLiteral(sql, value.bytes.data(), value.bytes.size());
+        out.sql += '?';
+        if (value.null) {
+            out.params.AddNull();
+        } else {
+            out.params.Add(DAParamKind::Blob, value.bytes.data(), value.bytes.size());
+        }
     }
 }
 
 // Appends "c = c + 1" ("c = c - 1" for a negative delta; the most
 // negative one stays an integer as "c + -9223372036854775808").
-void AppendIncrement(std::string& sql, const DABaseSet::TypedValue& value)
+void AppendIncrement(DASqlStatement& out, const DABaseSet::TypedValue& value)
 {
-    sql.append(value.column).append(" = ").append(value.column);
+    out.sql.append(value.column).append(" = ").append(value.column);
     if (value.delta >= 0 || value.delta == INT64_MIN) {
-        sql.append(" + ").append(std::to_string(value.delta));
+        out.sql += " + ";
+        AppendPiece(out, std::to_string(value.delta));
     } else {
-        sql.append(" - ").append(std::to_string(-value.delta));
+        out.sql += " - ";
+        AppendPiece(out, std::to_string(-value.delta));
     }
 }
 
 // Appends one listed condition: "ts<1700000000000", "k IN ('a', 'b')",
 // "v IS NULL".
-void AppendCondition(std::string& sql, const DABaseSet::Condition& condition)
+void AppendCondition(DASqlStatement& out, const DABaseSet::Condition& condition)
 {
     static const char* const kOperators[] = {"=", "<>", "<", "<=", ">", ">=", " LIKE ", " LIKE ", " LIKE ", " LIKE "};
+    std::string& sql = out.sql;
     sql += condition.column;
     switch (condition.form) {
     case DABaseSet::Condition::Form::Compare:
         sql += kOperators[static_cast<int>(condition.op)];
         if (condition.number) {
-            sql += condition.values.front();
+            AppendPiece(out, condition.values.front());
         } else {
-            AppendLiteral(sql, condition.values.front());
+            AppendLiteral(out, condition.values.front());
         }
         if (condition.op > DACompare::Like) {  // a text match: its pattern escapes with '\'
-            sql += " ESCAPE '\\'";
+            sql += " ESCAPE ";
+            AppendLiteral(out, "\\");
         }
         break;
     case DABaseSet::Condition::Form::Row:
@@ -79,7 +121,8 @@ void AppendCondition(std::string& sql, const DABaseSet::Condition& condition)
         sql += kOperators[static_cast<int>(condition.op)];
         sql += '(';
         for (const std::string& value : condition.values) {
-            sql += value + ", ";
+            AppendPiece(out, value);
+            sql += ", ";
         }
         sql.resize(sql.size() - 2);
         sql += ')';
@@ -87,7 +130,7 @@ void AppendCondition(std::string& sql, const DABaseSet::Condition& condition)
     case DABaseSet::Condition::Form::In:
         sql += " IN (";
         for (const std::string& value : condition.values) {
-            AppendLiteral(sql, value);
+            AppendLiteral(out, value);
             sql += ", ";
         }
         if (!condition.values.empty()) {
@@ -104,72 +147,97 @@ void AppendCondition(std::string& sql, const DABaseSet::Condition& condition)
     }
 }
 
+// Whether a text value in params holds " AND", which the WHERE builder's
+// cut of an update without conditions would find inside its literal.
+bool AnyTextHoldsAnd(const DASqlParams& params)
+{
+    bool found = false;
+    params.View().ForEach([&](DAParamKind kind, const char* bytes, std::size_t size) {
+        found = found || (kind == DAParamKind::Text && std::string(bytes, size).find(" AND") != std::string::npos);
+    });
+    return found;
+}
+
 // The one WHERE builder: " WHERE " with the equalities in map order, then
 // the listed conditions in call order, joined by " AND "; then a cut at the
 // last " AND" of the whole text. Without any condition nothing is written,
 // unless always (the update's shape), which writes " WHERE " and cuts as
 // ever.
-void AppendWhere(std::string& sql, DABaseSet& request, bool always)
+void AppendWhere(DASqlStatement& out, DABaseSet& request, bool always)
 {
     DAValueMap conditions;
     std::vector<DABaseSet::Condition> listed;
     request.GetWhereMap(conditions);
     request.GetConditions(listed);
-    if (conditions.empty() && listed.empty() && !always) {
-        return;
+    if (conditions.empty() && listed.empty()) {
+        if (!always) {
+            return;
+        }
+        // The cut can reach back into the text's literals: a shape, which
+        // has none, would not be cut where the text is.
+        if (out.shaped && AnyTextHoldsAnd(out.params)) {
+            out.shaped = false;
+            return;
+        }
     }
-    sql += " WHERE ";
+    out.sql += " WHERE ";
     for (const auto& condition : conditions) {
-        sql += condition.first;
-        sql += '=';
-        AppendLiteral(sql, condition.second);
-        sql += " AND ";
+        out.sql += condition.first;
+        out.sql += '=';
+        AppendLiteral(out, condition.second);
+        out.sql += " AND ";
     }
     for (const auto& condition : listed) {
-        AppendCondition(sql, condition);
-        sql += " AND ";
+        AppendCondition(out, condition);
+        out.sql += " AND ";
     }
-    CutAtLast(sql, " AND");
+    CutAtLast(out.sql, " AND");
 }
 
 // "<head>t (a, b) VALUES ('1', '2')", the data map in map order, then the
 // typed values in call order, increments last: the insert statements'
 // shared shape.
-void WriteInsert(const char* head, DABaseSet& request, const std::string& table, std::string& sql)
+void WriteInsert(const char* head, DABaseSet& request, const std::string& table, DASqlStatement& out)
 {
     DAValueMap data;
     std::vector<DABaseSet::TypedValue> typed;
     request.GetDataMap(data);
     request.GetTypedData(typed);
 
-    std::string columns = " (";
-    std::string values = "VALUES (";
-    for (const auto& entry : data) {
-        columns += entry.first;
-        columns += ", ";
-        AppendLiteral(values, entry.second);
-        values += ", ";
-    }
     // The increments' columns come last, their delta as the value.
+    std::vector<const DABaseSet::TypedValue*> ordered;
+    ordered.reserve(typed.size());
     for (const bool increments : {false, true}) {
         for (const auto& value : typed) {
             if (value.increment == increments) {
-                columns += value.column;
-                columns += ", ";
-                AppendTyped(values, value);
-                values += ", ";
+                ordered.push_back(&value);
             }
         }
     }
-    CutAtLast(columns, ", ");
-    columns += ") ";
-    CutAtLast(values, ", ");
-    values += ')';
-    // Built in one buffer of the final size: batches write many of these.
-    std::string text;
-    text.reserve(std::char_traits<char>::length(head) + table.size() + columns.size() + values.size());
-    text.append(head).append(table).append(columns).append(values);
-    sql = std::move(text);
+    std::string& sql = out.sql;
+    sql.reserve(std::char_traits<char>::length(head) + table.size() + 16 * (data.size() + typed.size()) + 16);
+    sql.append(head).append(table).append(" (");
+    for (const auto& entry : data) {
+        sql.append(entry.first).append(", ");
+    }
+    for (const auto* value : ordered) {
+        sql.append(value->column).append(", ");
+    }
+    CutAtLast(sql, ", ");  // names are plain: the cut falls after the last
+    sql += ") VALUES (";
+    const std::size_t bare = sql.size();
+    for (const auto& entry : data) {
+        AppendLiteral(out, entry.second);
+        sql += ", ";
+    }
+    for (const auto* value : ordered) {
+        AppendTyped(out, *value);
+        sql += ", ";
+    }
+    if (sql.size() != bare) {
+        sql.resize(sql.size() - 2);
+    }
+    sql += ')';
 }
 
 // The select list's items, each followed by ", ": "type, COUNT(*) AS n, ".
@@ -190,8 +258,9 @@ void AppendSelectList(std::string& text, const std::vector<DAQueryRequest::Selec
 
 // " GROUP BY a, b", " ORDER BY a, b DESC" (or by defaultOrder, when given,
 // without sort keys), " LIMIT n OFFSET m": the end of every query.
-void AppendQueryTail(std::string& text, DAQueryRequest& request, const char* defaultOrder)
+void AppendQueryTail(DASqlStatement& out, DAQueryRequest& request, const char* defaultOrder)
 {
+    std::string& text = out.sql;
     DAOrderKeys keys;
     int count = -1;
     int offset = 0;
@@ -218,45 +287,63 @@ void AppendQueryTail(std::string& text, DAQueryRequest& request, const char* def
         text += defaultOrder;
     }
     if (count >= 0 || offset > 0) {
-        text += " LIMIT " + std::to_string(count);
+        text += " LIMIT ";
+        AppendPiece(out, std::to_string(count));
         if (offset > 0) {
-            text += " OFFSET " + std::to_string(offset);
+            text += " OFFSET ";
+            AppendPiece(out, std::to_string(offset));
         }
     }
 }
 
 }  // namespace
 
-// By-value parameter: the signature of the published interface.
-// NOLINTNEXTLINE(performance-unnecessary-value-param)
-void DASqlGenerator::GetDBPath(std::string dir, std::string file, std::string& path)
+namespace {
+
+constexpr std::size_t kTypicalSize = 120;
+
+// Writes request into out with write, as DAWriteSql promises: from an
+// empty out, and as text when the shape could not be written.
+template <typename Request>
+void WriteWith(void (*write)(Request&, DASqlStatement&), Request& request, DASqlStatement& out)
 {
-    // An empty directory makes size() - 1 wrap to npos, the "no slash"
-    // result of rfind: the two compare equal and no "/" is added.
-    if (dir.rfind('/') != dir.size() - 1) {
-        dir += '/';
+    const bool shaped = out.shaped;
+    out.sql.clear();
+    out.sql.reserve(kTypicalSize);  // one allocation for most statements
+    out.params.Clear();
+    write(request, out);
+    if (shaped && !out.shaped) {
+        out.sql.clear();
+        out.params.Clear();
+        write(request, out);
     }
-    dir += file;
-    path = std::move(dir);
 }
 
-// By-value parameter: the signature of the published interface.
-// NOLINTNEXTLINE(performance-unnecessary-value-param)
-void DASqlGenerator::GetCheckTableSql(std::string table, std::string& sql)
+// A schema statement: text only.
+template <typename Request>
+void WriteText(void (*write)(Request&, DASqlStatement&), Request& request, DASqlStatement& out)
 {
-    std::string text = "SELECT COUNT(*) from sqlite_master WHERE TYPE='table' AND NAME=";
-    AppendLiteral(text, table);
-    sql = std::move(text);
+    out.shaped = false;
+    WriteWith(write, request, out);
 }
 
-void DASqlGenerator::GetDropTableSql(DADropRequest& request, std::string& sql)
+// The published text of a request's statement.
+template <typename Request>
+void TextOf(Request& request, std::string& sql)
+{
+    DASqlStatement out;
+    DAWriteSql(request, out);
+    sql = std::move(out.sql);
+}
+
+void WriteDropTable(DADropRequest& request, DASqlStatement& out)
 {
     std::string table;
     request.GetTable(table);
-    sql = "DROP TABLE " + table;
+    out.sql = "DROP TABLE " + table;
 }
 
-void DASqlGenerator::GetCreateTableSql(DACreateRequest& request, std::string& sql)
+void WriteCreateTable(DACreateRequest& request, DASqlStatement& out)
 {
     std::string table;
     std::string keyName;
@@ -272,7 +359,8 @@ void DASqlGenerator::GetCreateTableSql(DACreateRequest& request, std::string& sq
     const bool hasKey = !keyName.empty() && !keyType.empty();
     const bool hasComposite = hasKey && !compositeName.empty() && !compositeType.empty();
 
-    std::string text = "CREATE TABLE IF NOT EXISTS " + table;
+    std::string& text = out.sql;
+    text = "CREATE TABLE IF NOT EXISTS " + table;
     if (!hasKey) {
         text += " (_ID INTEGER PRIMARY KEY, ";
     } else if (!hasComposite) {
@@ -291,41 +379,35 @@ void DASqlGenerator::GetCreateTableSql(DACreateRequest& request, std::string& sq
     }
     CutAtLast(text, ", ");
     text += ')';
-    sql = std::move(text);
 }
 
-void DASqlGenerator::GetSelectSql(DASelectRequest& request, std::string& sql)
+void WriteSelect(DASelectRequest& request, DASqlStatement& out)
 {
     std::string table;
     request.GetTable(table);
-
-    std::string text = "SELECT * FROM " + table;
-    AppendWhere(text, request, false);
-    sql = std::move(text);
+    out.sql.append("SELECT * FROM ").append(table);
+    AppendWhere(out, request, false);
 }
 
-void DASqlGenerator::GetQuerySql(DAQueryRequest& request, std::string& sql)
+void WriteQuery(DAQueryRequest& request, DASqlStatement& out)
 {
     std::vector<DAQueryRequest::SelectItem> items;
     request.GetColumns(items);
-
-    std::string text;
     if (items.empty()) {
-        GetSelectSql(request, text);
+        WriteSelect(request, out);
     } else {
         std::string table;
         request.GetTable(table);
-        text = "SELECT ";
-        AppendSelectList(text, items);
-        text.resize(text.size() - 2);
-        text += " FROM " + table;
-        AppendWhere(text, request, false);
+        out.sql += "SELECT ";
+        AppendSelectList(out.sql, items);
+        out.sql.resize(out.sql.size() - 2);
+        out.sql.append(" FROM ").append(table);
+        AppendWhere(out, request, false);
     }
-    AppendQueryTail(text, request, nullptr);
-    sql = std::move(text);
+    AppendQueryTail(out, request, nullptr);
 }
 
-void DASqlGenerator::GetJoinSql(DAJoinRequest& request, std::string& sql)
+void WriteJoin(DAJoinRequest& request, DASqlStatement& out)
 {
     std::string leftTable;
     std::string leftColumn;
@@ -334,24 +416,24 @@ void DASqlGenerator::GetJoinSql(DAJoinRequest& request, std::string& sql)
     request.GetLeftJoin(leftTable, leftColumn);
     request.GetRightJoin(rightTable, rightColumn);
 
-    std::string text = "SELECT  * FROM " + leftTable + " INNER JOIN " + rightTable + " ON " + leftTable + "." +
-        leftColumn + " = " + rightTable + "." + rightColumn;
-    AppendWhere(text, request, false);
-    sql = std::move(text);
+    out.sql = "SELECT  * FROM " + leftTable + " INNER JOIN " + rightTable + " ON " + leftTable + "." + leftColumn +
+        " = " + rightTable + "." + rightColumn;
+    AppendWhere(out, request, false);
 }
 
-void DASqlGenerator::GetUpsertSql(DAUpsertRequest& request, std::string& sql)
+void WriteUpsert(DAUpsertRequest& request, DASqlStatement& out)
 {
     std::string table;
     std::vector<std::string> keys;
     request.GetTable(table);
     request.GetConflictKeys(keys);
     if (keys.empty()) {
-        WriteInsert("INSERT OR REPLACE INTO ", request, table, sql);
+        WriteInsert("INSERT OR REPLACE INTO ", request, table, out);
         return;
     }
-    WriteInsert("INSERT INTO ", request, table, sql);
-    std::string text = " ON CONFLICT(";
+    WriteInsert("INSERT INTO ", request, table, out);
+    std::string& text = out.sql;
+    text += " ON CONFLICT(";
     for (const std::string& key : keys) {
         text += key + ", ";
     }
@@ -377,7 +459,7 @@ void DASqlGenerator::GetUpsertSql(DAUpsertRequest& request, std::string& sql)
     }
     for (const auto& value : typed) {
         if (value.increment) {
-            AppendIncrement(text, value);
+            AppendIncrement(out, value);
             text += ", ";
         }
     }
@@ -387,10 +469,9 @@ void DASqlGenerator::GetUpsertSql(DAUpsertRequest& request, std::string& sql)
     } else {
         text.resize(text.size() - 2);
     }
-    sql += text;
 }
 
-void DASqlGenerator::GetUpdateSql(DAUpdateRequest& request, std::string& sql)
+void WriteUpdate(DAUpdateRequest& request, DASqlStatement& out)
 {
     std::string table;
     DAValueMap data;
@@ -399,39 +480,37 @@ void DASqlGenerator::GetUpdateSql(DAUpdateRequest& request, std::string& sql)
     request.GetDataMap(data);
     request.GetTypedData(typed);
 
-    std::string text = "UPDATE " + table + " SET ";
+    std::string& text = out.sql;
+    text.append("UPDATE ").append(table).append(" SET ");
     for (const auto& entry : data) {
         text += entry.first;
         text += " = ";
-        AppendLiteral(text, entry.second);
+        AppendLiteral(out, entry.second);
         text += ", ";
     }
     for (const auto& value : typed) {
         if (value.increment) {
-            AppendIncrement(text, value);
+            AppendIncrement(out, value);
         } else {
             text += value.column;
             text += " = ";
-            AppendTyped(text, value);
+            AppendTyped(out, value);
         }
         text += ", ";
     }
     CutAtLast(text, ", ");
-    AppendWhere(text, request, true);
-    sql = std::move(text);
+    AppendWhere(out, request, true);
 }
 
-void DASqlGenerator::GetDeleteSql(DADeleteRequest& request, std::string& sql)
+void WriteDelete(DADeleteRequest& request, DASqlStatement& out)
 {
     std::string table;
     request.GetTable(table);
-
-    std::string text = "DELETE  FROM " + table;
-    AppendWhere(text, request, false);
-    sql = std::move(text);
+    out.sql.append("DELETE  FROM ").append(table);
+    AppendWhere(out, request, false);
 }
 
-void DASqlGenerator::GetCreateIndexSql(DACreateIndexRequest& request, std::string& sql)
+void WriteCreateIndex(DACreateIndexRequest& request, DASqlStatement& out)
 {
     std::string table;
     std::string name;
@@ -440,7 +519,8 @@ void DASqlGenerator::GetCreateIndexSql(DACreateIndexRequest& request, std::strin
     request.GetName(name);
     request.GetColumns(columns);
 
-    std::string text = request.IsUnique() ? "CREATE UNIQUE INDEX IF NOT EXISTS " : "CREATE INDEX IF NOT EXISTS ";
+    std::string& text = out.sql;
+    text = request.IsUnique() ? "CREATE UNIQUE INDEX IF NOT EXISTS " : "CREATE INDEX IF NOT EXISTS ";
     text += name + " ON " + table + " (";
     for (const auto& column : columns) {
         text += column.first;
@@ -448,10 +528,9 @@ void DASqlGenerator::GetCreateIndexSql(DACreateIndexRequest& request, std::strin
     }
     CutAtLast(text, ", ");
     text += ')';
-    sql = std::move(text);
 }
 
-void DASqlGenerator::GetAddColumnSql(DAAddColumnRequest& request, std::string& sql)
+void WriteAddColumn(DAAddColumnRequest& request, DASqlStatement& out)
 {
     std::string table;
     std::string column;
@@ -460,12 +539,147 @@ void DASqlGenerator::GetAddColumnSql(DAAddColumnRequest& request, std::string& s
     request.GetTable(table);
     request.GetColumn(column, type);
 
-    std::string text = "ALTER TABLE " + table + " ADD COLUMN " + column + " " + type;
+    out.sql = "ALTER TABLE " + table + " ADD COLUMN " + column + " " + type;
     if (request.GetDefault(value)) {
-        text += " DEFAULT ";
-        AppendLiteral(text, value);
+        out.sql += " DEFAULT ";
+        DAAppendTextLiteral(out.sql, value);
     }
+}
+
+void WriteInsertRequest(DAInsertRequest& request, DASqlStatement& out)
+{
+    std::string table;
+    request.GetTable(table);
+    WriteInsert(request.GetIgnoreExisting() ? "INSERT OR IGNORE INTO " : "INSERT INTO ", request, table, out);
+}
+
+}  // namespace
+
+void DAWriteSql(DAQueryRequest& request, DASqlStatement& out)
+{
+    WriteWith(WriteQuery, request, out);
+}
+
+void DAWriteSql(DASelectRequest& request, DASqlStatement& out)
+{
+    WriteWith(WriteSelect, request, out);
+}
+
+void DAWriteSql(DAJoinRequest& request, DASqlStatement& out)
+{
+    WriteWith(WriteJoin, request, out);
+}
+
+void DAWriteSql(DAUpsertRequest& request, DASqlStatement& out)
+{
+    WriteWith(WriteUpsert, request, out);
+}
+
+void DAWriteSql(DAUpdateRequest& request, DASqlStatement& out)
+{
+    WriteWith(WriteUpdate, request, out);
+}
+
+void DAWriteSql(DADeleteRequest& request, DASqlStatement& out)
+{
+    WriteWith(WriteDelete, request, out);
+}
+
+void DAWriteSql(DAInsertRequest& request, DASqlStatement& out)
+{
+    WriteWith(WriteInsertRequest, request, out);
+}
+
+void DAWriteSql(DACreateRequest& request, DASqlStatement& out)
+{
+    WriteText(WriteCreateTable, request, out);
+}
+
+void DAWriteSql(DADropRequest& request, DASqlStatement& out)
+{
+    WriteText(WriteDropTable, request, out);
+}
+
+void DAWriteSql(DACreateIndexRequest& request, DASqlStatement& out)
+{
+    WriteText(WriteCreateIndex, request, out);
+}
+
+void DAWriteSql(DAAddColumnRequest& request, DASqlStatement& out)
+{
+    WriteText(WriteAddColumn, request, out);
+}
+
+// By-value parameter: the signature of the published interface.
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
+void DASqlGenerator::GetDBPath(std::string dir, std::string file, std::string& path)
+{
+    // An empty directory makes size() - 1 wrap to npos, the "no slash"
+    // result of rfind: the two compare equal and no "/" is added.
+    if (dir.rfind('/') != dir.size() - 1) {
+        dir += '/';
+    }
+    dir += file;
+    path = std::move(dir);
+}
+
+// By-value parameter: the signature of the published interface.
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
+void DASqlGenerator::GetCheckTableSql(std::string table, std::string& sql)
+{
+    std::string text = "SELECT COUNT(*) from sqlite_master WHERE TYPE='table' AND NAME=";
+    DAAppendTextLiteral(text, table);
     sql = std::move(text);
+}
+
+void DASqlGenerator::GetDropTableSql(DADropRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetCreateTableSql(DACreateRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetSelectSql(DASelectRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetQuerySql(DAQueryRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetJoinSql(DAJoinRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetUpsertSql(DAUpsertRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetUpdateSql(DAUpdateRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetDeleteSql(DADeleteRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetCreateIndexSql(DACreateIndexRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+void DASqlGenerator::GetAddColumnSql(DAAddColumnRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
 }
 
 void DASqlGenerator::GetCompactSql(DABasePath& /*location*/, std::string& sql)
@@ -475,9 +689,7 @@ void DASqlGenerator::GetCompactSql(DABasePath& /*location*/, std::string& sql)
 
 void DASqlGenerator::GetInsertSql(DAInsertRequest& request, std::string& sql)
 {
-    std::string table;
-    request.GetTable(table);
-    WriteInsert(request.GetIgnoreExisting() ? "INSERT OR IGNORE INTO " : "INSERT INTO ", request, table, sql);
+    TextOf(request, sql);
 }
 
 namespace {
@@ -560,22 +772,24 @@ void AppendMatch(std::string& sql, const std::string& typed, bool prefix, const 
         words += '*';
     }
     if (!shortWord) {
-        AppendLiteral(sql, words);
+        DAAppendTextLiteral(sql, words);
         return;
     }
     const std::string whole = typed.substr(first, end - first);
     sql += "CASE WHEN (SELECT sql FROM sqlite_master WHERE name=";
-    AppendLiteral(sql, index);
+    DAAppendTextLiteral(sql, index);
     sql += ") LIKE '%''trigram''%' THEN ";
-    AppendLiteral(sql, CharacterCount(whole) < kTrigram ? "\"\"" : Fts5String(whole));
+    DAAppendTextLiteral(sql, CharacterCount(whole) < kTrigram ? "\"\"" : Fts5String(whole));
     sql += " ELSE ";
-    AppendLiteral(sql, words);
+    DAAppendTextLiteral(sql, words);
     sql += " END";
 }
 
 }  // namespace
 
-void DASqlGenerator::GetCreateSearchIndexSql(DASearchIndexRequest& request, std::string& sql)
+namespace {
+
+void WriteCreateSearchIndex(DASearchIndexRequest& request, DASqlStatement& out)
 {
     std::string table;
     std::string name;
@@ -614,22 +828,10 @@ void DASqlGenerator::GetCreateSearchIndexSql(DASearchIndexRequest& request, std:
         " BEGIN DELETE FROM " + index + " WHERE rowid IN (OLD.rowid, NEW.rowid); " + insert;
     text +=
         trigger + "_delete AFTER DELETE ON " + table + " BEGIN DELETE FROM " + index + " WHERE rowid = OLD.rowid; END";
-    sql = std::move(text);
+    out.sql = std::move(text);
 }
 
-// By-value parameter: the shape of GetCheckTableSql.
-// NOLINTNEXTLINE(performance-unnecessary-value-param)
-void DASqlGenerator::GetDropSearchIndexSql(std::string name, std::string& sql)
-{
-    const std::string index = kSearchPrefix + name;
-    std::string text;
-    for (const char* trigger : {"_insert", "_update", "_delete"}) {
-        text += "DROP TRIGGER IF EXISTS " + index + trigger + "; ";
-    }
-    sql = text + "DROP TABLE IF EXISTS " + index;
-}
-
-void DASqlGenerator::GetSearchSql(DASearchRequest& request, std::string& sql)
+void WriteSearch(DASearchRequest& request, DASqlStatement& out)
 {
     std::string table;
     std::string name;
@@ -643,7 +845,8 @@ void DASqlGenerator::GetSearchSql(DASearchRequest& request, std::string& sql)
     request.GetSnippets(snippets);
 
     const std::string index = kSearchPrefix + name;
-    std::string text = "SELECT ";
+    std::string& text = out.sql;
+    text = "SELECT ";
     if (items.empty()) {
         text += table + ".*, ";
     }
@@ -660,13 +863,13 @@ void DASqlGenerator::GetSearchSql(DASearchRequest& request, std::string& sql)
         // The column's place in the index, from the index itself; one it
         // does not hold is out of range.
         text += ", snippet(" + index + ", IFNULL((SELECT cid FROM pragma_table_info(";
-        AppendLiteral(text, index);
+        DAAppendTextLiteral(text, index);
         text += ") WHERE name=";
-        AppendLiteral(text, snippet.column);
+        DAAppendTextLiteral(text, snippet.column);
         text += "), 32767), ";
-        AppendLiteral(text, snippet.before);
+        DAAppendTextLiteral(text, snippet.before);
         text += ", ";
-        AppendLiteral(text, snippet.after);
+        DAAppendTextLiteral(text, snippet.after);
         text += ", '\xE2\x80\xA6', " + std::to_string(snippet.words) + ") AS " + snippet.as;
     }
     text += " FROM " + index + " WHERE " + index + " MATCH ";
@@ -674,7 +877,40 @@ void DASqlGenerator::GetSearchSql(DASearchRequest& request, std::string& sql)
     // Joined by rowid, so an entry whose row is gone (replaced under
     // another key) finds nothing.
     text += ") AS ulo_hit ON " + table + ".rowid = ulo_hit.ulo_rowid";
-    AppendWhere(text, request, false);
-    AppendQueryTail(text, request, "ulo_hit.ulo_rank");
-    sql = std::move(text);
+    AppendWhere(out, request, false);
+    AppendQueryTail(out, request, "ulo_hit.ulo_rank");
+}
+
+}  // namespace
+
+void DAWriteSql(DASearchIndexRequest& request, DASqlStatement& out)
+{
+    WriteText(WriteCreateSearchIndex, request, out);
+}
+
+void DAWriteSql(DASearchRequest& request, DASqlStatement& out)
+{
+    WriteText(WriteSearch, request, out);
+}
+
+void DASqlGenerator::GetCreateSearchIndexSql(DASearchIndexRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
+}
+
+// By-value parameter: the shape of GetCheckTableSql.
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
+void DASqlGenerator::GetDropSearchIndexSql(std::string name, std::string& sql)
+{
+    const std::string index = kSearchPrefix + name;
+    std::string text;
+    for (const char* trigger : {"_insert", "_update", "_delete"}) {
+        text += "DROP TRIGGER IF EXISTS " + index + trigger + "; ";
+    }
+    sql = text + "DROP TABLE IF EXISTS " + index;
+}
+
+void DASqlGenerator::GetSearchSql(DASearchRequest& request, std::string& sql)
+{
+    TextOf(request, sql);
 }

@@ -6,8 +6,6 @@
 
 namespace {
 
-constexpr std::size_t kMaxLiterals = 999;
-
 bool IsNameByte(unsigned char byte)
 {
     return (byte >= 'a' && byte <= 'z') || (byte >= 'A' && byte <= 'Z') || (byte >= '0' && byte <= '9') ||
@@ -89,25 +87,33 @@ bool MayStartSomething(char c)
 
 }  // namespace
 
-bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>& values)
+bool DASplitLiterals(const char* sql, std::string& shape, DASqlParams& values)
 {
     if (!StartsWithDml(sql)) {
         return false;
     }
     shape.clear();
     shape.reserve(std::strlen(sql));
-    values.clear();
-    for (const char* c = sql; *c != '\0';) {
-        const bool glued = c != sql && (IsNameByte(static_cast<unsigned char>(c[-1])) || c[-1] == '.');
-        DALiteral literal;
+    values.Clear();
+    return DASplitAppend(sql, shape, values);
+}
+
+bool DASplitAppend(const char* piece, std::string& shape, DASqlParams& values)
+{
+    std::string text;
+    for (const char* c = piece; *c != '\0';) {
+        const bool glued = c != piece && (IsNameByte(static_cast<unsigned char>(c[-1])) || c[-1] == '.');
+        DAParamKind kind = DAParamKind::Text;
+        std::int64_t integer = 0;
+        text.clear();
         if (!glued && c[0] == 'X' && c[1] == '\'') {
-            c = ReadBlob(c, literal.text);
+            c = ReadBlob(c, text);
             if (c == nullptr) {
                 return false;
             }
-            literal.kind = DALiteral::Kind::Blob;
+            kind = DAParamKind::Blob;
         } else if (!glued && IsNullValue(c, shape)) {
-            literal.kind = DALiteral::Kind::Null;
+            kind = DAParamKind::Null;
             c += 4;
         } else if (*c == '\'') {
             if (glued) {  // x'00' is a blob
@@ -118,32 +124,31 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
                 if (quote == nullptr) {
                     return false;  // unterminated: SQLite says so
                 }
-                literal.text.append(c, quote);
+                text.append(c, quote);
                 c = quote + 1;
                 if (*c != '\'') {
                     break;
                 }
-                literal.text += '\'';  // a doubled quote
+                text += '\'';  // a doubled quote
             }
         } else if (*c >= '0' && *c <= '9' && !glued) {
             // The whole number: digits, a fraction, an exponent.
             const char* end = c + std::strspn(c, "0123456789");
-            const bool integer = *end != '.' && *end != 'e' && *end != 'E';
-            literal.kind = integer ? DALiteral::Kind::Integer : DALiteral::Kind::Text;
+            const bool whole = *end != '.' && *end != 'e' && *end != 'E';
             end += *end == '.' ? 1 + std::strspn(end + 1, "0123456789") : 0;
             if (*end == 'e' || *end == 'E') {
                 ++end;
                 end += *end == '+' || *end == '-' ? 1 : 0;
                 end += std::strspn(end, "0123456789");
             }
-            literal.text.assign(c, end);
             errno = 0;
-            std::strtoll(c, nullptr, 10);
-            if (!integer || errno == ERANGE) {
-                shape += literal.text;
+            integer = std::strtoll(c, nullptr, 10);
+            if (!whole || errno == ERANGE) {
+                shape.append(c, end);
                 c = end;
                 continue;
             }
+            kind = DAParamKind::Integer;
             c = end;
         } else if (std::strchr(";\"`[?:@$", *c) != nullptr || (c[0] == '-' && c[1] == '-') ||
                    (c[0] == '/' && c[1] == '*')) {
@@ -159,45 +164,24 @@ bool DASplitLiterals(const char* sql, std::string& shape, std::vector<DALiteral>
             c = end;
             continue;
         }
-        if (IsNameByte(static_cast<unsigned char>(*c)) || values.size() == kMaxLiterals) {
+        if (IsNameByte(static_cast<unsigned char>(*c)) || values.Count() == kDAMaxParams) {
             return false;  // a literal glued to a name, or too many
         }
-        values.push_back(std::move(literal));
+        if (kind == DAParamKind::Integer) {
+            values.AddInteger(integer);
+        } else {
+            values.Add(kind, text.data(), text.size());
+        }
         shape += '?';
     }
     return true;
 }
 
-int DABindLiterals(sqlite3_stmt* stmt, const std::vector<DALiteral>& values)
-{
-    int rc = SQLITE_OK;
-    for (std::size_t i = 0; rc == SQLITE_OK && i < values.size(); ++i) {
-        const DALiteral& value = values[i];
-        const int index = static_cast<int>(i + 1);
-        const auto size = static_cast<sqlite3_uint64>(value.text.size());
-        switch (value.kind) {
-        case DALiteral::Kind::Integer:
-            rc = sqlite3_bind_int64(stmt, index, std::strtoll(value.text.c_str(), nullptr, 10));
-            break;
-        case DALiteral::Kind::Null:
-            rc = sqlite3_bind_null(stmt, index);
-            break;
-        case DALiteral::Kind::Blob:
-            rc = sqlite3_bind_blob64(stmt, index, value.text.data(), size, SQLITE_STATIC);
-            break;
-        case DALiteral::Kind::Text:
-            rc = sqlite3_bind_text64(stmt, index, value.text.data(), size, SQLITE_STATIC, SQLITE_UTF8);
-            break;
-        }
-    }
-    return rc;
-}
-
-sqlite3_stmt* DAStatementCache::Take(const std::string& shape)
+sqlite3_stmt* DAStatementCache::Take(const char* shape)
 {
     for (auto entry = m_entries.begin(); entry != m_entries.end(); ++entry) {
-        if (entry->first == shape) {
-            sqlite3_stmt* stmt = entry->second.release();
+        if (std::strcmp(sqlite3_sql(entry->get()), shape) == 0) {
+            sqlite3_stmt* stmt = entry->release();
             m_entries.erase(entry);
             return stmt;
         }
@@ -205,7 +189,7 @@ sqlite3_stmt* DAStatementCache::Take(const std::string& shape)
     return nullptr;
 }
 
-void DAStatementCache::Put(const std::string& shape, sqlite3_stmt* stmt) noexcept
+void DAStatementCache::Put(sqlite3_stmt* stmt) noexcept
 {
     DAStatement owned(stmt);
     sqlite3_reset(stmt);
@@ -214,7 +198,7 @@ void DAStatementCache::Put(const std::string& shape, sqlite3_stmt* stmt) noexcep
         if (m_entries.size() == kCapacity) {
             m_entries.pop_back();
         }
-        m_entries.emplace(m_entries.begin(), shape, std::move(owned));
+        m_entries.insert(m_entries.begin(), std::move(owned));
     } catch (...) {  // std::bad_alloc: the statement goes (owned finalizes it)
     }
 }

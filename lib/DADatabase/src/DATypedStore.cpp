@@ -4,6 +4,9 @@
 
 namespace {
 
+// The arena's room at the first row: the texts of a typical row.
+constexpr std::size_t kFirstRowBytes = 256;
+
 // Holds the connection's mutex over the reads of a row: each sqlite3_column_
 // call would take it again, and a column's value read under it is
 // protected (sqlite3_value_ reads are allowed on it).
@@ -106,9 +109,10 @@ int DATypedStore::Append(sqlite3_stmt* stmt)
         TakeNames(stmt);
     }
     const auto count = static_cast<int>(names.size());
-    if (rows == 0) {  // a one-row result (a read by key) grows its vectors once
+    if (rows == 0) {  // a one-row result (a read by key) allocates each buffer once
         types.reserve(names.size());
         values.reserve(names.size());
+        arena.reserve(kFirstRowBytes);
     }
     const RowLock lock(stmt);
     for (int i = 0; i < count; ++i) {

@@ -7,59 +7,60 @@
 
 #include "DALocationRule.h"
 #include "DALog.h"
-#include "DASqlGenerator.h"
+#include "DASqlStatement.h"
 
 int DABatchRequest::CheckLocation(DABasePath& request)
 {
     return DACheckLocation(*this, request, DA_FILE_NAME, "Add", __LINE__, "batch", m_scratch);
 }
 
-template <typename Request, typename Generate>
-int DABatchRequest::AddStatement(Request& request, Generate generate)
+template <typename Request>
+int DABatchRequest::AddStatement(Request& request)
 {
     const int rc = CheckLocation(request);
     if (rc != SQLITE_OK) {
         return rc;
     }
-    std::string sql;
-    (DASqlGenerator().*generate)(request, sql);
-
-    const std::size_t needed = m_texts.size() + sql.size() + 1;
+    // Kept as shape and values where the statement takes them: a session
+    // binds them into the statement it keeps for the shape.
+    DASqlStatement statement;
+    statement.shaped = true;
+    DAWriteSql(request, statement);
+    const std::size_t needed = m_texts.size() + DAPackedSize(statement);
     if (needed > m_texts.capacity()) {
         // A quarter more rather than the usual doubling: a full batch then
         // holds at most about 1.25 times its texts. vector::reserve
         // allocates exactly what it is asked for.
         m_texts.reserve(std::max(needed, m_texts.capacity() + m_texts.capacity() / 4));
     }
-    m_texts.insert(m_texts.end(), sql.begin(), sql.end());
-    m_texts.push_back('\0');
+    DAPackStatement(statement, m_texts);
     ++m_count;
     return SQLITE_OK;
 }
 
 int DABatchRequest::Add(DAUpsertRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetUpsertSql);
+    return AddStatement(request);
 }
 
 int DABatchRequest::Add(DAUpdateRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetUpdateSql);
+    return AddStatement(request);
 }
 
 int DABatchRequest::Add(DADeleteRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetDeleteSql);
+    return AddStatement(request);
 }
 
 int DABatchRequest::Add(DACreateRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetCreateTableSql);
+    return AddStatement(request);
 }
 
 int DABatchRequest::Add(DADropRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetDropTableSql);
+    return AddStatement(request);
 }
 
 void DABatchRequest::Clear()
@@ -71,18 +72,18 @@ void DABatchRequest::Clear()
 
 int DABatchRequest::Add(DACreateIndexRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetCreateIndexSql);
+    return AddStatement(request);
 }
 
 int DABatchRequest::Add(DAAddColumnRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetAddColumnSql);
+    return AddStatement(request);
 }
 
 int DABatchRequest::Add(DAInsertRequest& request)
 {
     m_inserts.reserve(m_inserts.size() + 1);  // so that a failure below leaves the batch as it was
-    const int rc = AddStatement(request, &DASqlGenerator::GetInsertSql);
+    const int rc = AddStatement(request);
     if (rc == SQLITE_OK) {
         m_inserts.push_back(m_count);
     }
@@ -91,5 +92,5 @@ int DABatchRequest::Add(DAInsertRequest& request)
 
 int DABatchRequest::Add(DASearchIndexRequest& request)
 {
-    return AddStatement(request, &DASqlGenerator::GetCreateSearchIndexSql);
+    return AddStatement(request);
 }
