@@ -1,63 +1,45 @@
 // libFuzzer target: fills every request and a cursor from the input,
 // generates every statement, and moves through and reads the cursor; every
 // statement, and the input's last text, is split as a session would keep
-// it, and must come back whole from its shape and literals.
+// it, and must come back whole from its shape and literals, as must the
+// shape and values written for a request.
 #include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <iterator>
 #include <string>
-#include <vector>
 
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include "DACursor.h"
 #include "DASqlGenerator.h"
+#include "DASqlStatement.h"
 #include "DAStatementCache.h"
 #include "dlog.h"
 
 namespace {
 
 // A text that splits must be its shape with the literals put back.
-void CheckSplit(const std::string& sql)
+void CheckSplit(const std::string& sql, std::string& shape, DASqlParams& values)
 {
-    std::string shape;
-    std::vector<DALiteral> values;
     if (!DASplitLiterals(sql.c_str(), shape, values)) {
         return;
     }
     std::string back;
-    std::size_t next = 0;
-    for (const char c : shape) {
-        if (c != '?') {
-            back += c;
-            continue;
-        }
-        const DALiteral& value = values.at(next++);
-        if (value.kind == DALiteral::Kind::Integer) {
-            back += value.text;
-            continue;
-        }
-        if (value.kind == DALiteral::Kind::Null) {
-            back += "NULL";
-            continue;
-        }
-        if (value.kind == DALiteral::Kind::Blob) {
-            back += "X'";
-            for (const char v : value.text) {
-                back += "0123456789ABCDEF"[static_cast<unsigned char>(v) >> 4U];
-                back += "0123456789ABCDEF"[static_cast<unsigned char>(v) & 0xFU];
-            }
-            back += '\'';
-            continue;
-        }
-        back += '\'';
-        for (const char v : value.text) {
-            back += v == '\'' ? "''" : std::string(1, v);
-        }
-        back += '\'';
+    values.View().Render(shape.c_str(), back);
+    if (back != sql.substr(0, sql.find('\0'))) {
+        __builtin_trap();
     }
-    if (back != sql.substr(0, sql.find('\0')) || next != values.size()) {
+}
+
+// The shape and values written for request must give back its text.
+template <typename Request>
+void CheckShapes(Request& request, const std::string& sql)
+{
+    DASqlStatement written;
+    written.shaped = true;
+    DAWriteSql(request, written);
+    if (written.Text() != sql) {
         __builtin_trap();
     }
 }
@@ -120,13 +102,13 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     generator.GetDBPath(text, text, sql), generator.GetCheckTableSql(text, sql), generator.GetDropTableSql(drop, sql);
     generator.GetCreateTableSql(create, sql), generator.GetSelectSql(select, sql), generator.GetJoinSql(join, sql);
     generator.GetUpsertSql(upsert, sql), generator.GetUpdateSql(update, sql), generator.GetDeleteSql(remove, sql);
-    CheckSplit(text);
-    std::string statements[5];
-    generator.GetQuerySql(query, statements[0]), generator.GetInsertSql(insert, statements[1]);
-    generator.GetSelectSql(select, statements[2]), generator.GetUpdateSql(update, statements[3]);
-    generator.GetDeleteSql(remove, statements[4]);
-    for (const std::string& statement : statements) {
-        CheckSplit(statement);
-    }
+    std::string shape;
+    DASqlParams values;
+    CheckSplit(text, shape, values);
+    generator.GetQuerySql(query, sql), CheckShapes(query, sql), generator.GetInsertSql(insert, sql);
+    CheckShapes(insert, sql), generator.GetSelectSql(select, sql), CheckShapes(select, sql);
+    generator.GetUpdateSql(update, sql), CheckShapes(update, sql), generator.GetDeleteSql(remove, sql);
+    CheckShapes(remove, sql), generator.GetUpsertSql(upsert, sql), CheckShapes(upsert, sql);
+    generator.GetJoinSql(join, sql), CheckShapes(join, sql);
     return 0;
 }

@@ -302,6 +302,18 @@ namespace {
 
 constexpr std::size_t kTypicalSize = 120;
 
+// Whether a shape holds nothing a split of its text would read otherwise:
+// one "?" per value and none of the bytes that make a split refuse a text
+// (a name written as it was given may hold any). Then writing the values
+// back into the shape gives the text.
+bool StandsAlone(const DASqlStatement& out)
+{
+    const std::string& shape = out.sql;
+    return shape.find_first_of("'\";`[:@$") == std::string::npos && shape.find("--") == std::string::npos &&
+        shape.find("/*") == std::string::npos &&
+        static_cast<std::size_t>(std::count(shape.begin(), shape.end(), '?')) == out.params.Count();
+}
+
 // Writes request into out with write, as DAWriteSql promises: from an
 // empty out, and as text when the shape could not be written.
 template <typename Request>
@@ -312,7 +324,8 @@ void WriteWith(void (*write)(Request&, DASqlStatement&), Request& request, DASql
     out.sql.reserve(kTypicalSize);  // one allocation for most statements
     out.params.Clear();
     write(request, out);
-    if (shaped && !out.shaped) {
+    if (shaped && (!out.shaped || !StandsAlone(out))) {
+        out.shaped = false;
         out.sql.clear();
         out.params.Clear();
         write(request, out);

@@ -51,13 +51,10 @@ int DASqlParamsView::Bind(sqlite3_stmt* stmt) const
 void DASqlParamsView::Render(const char* shape, std::string& text) const
 {
     const char* at = shape;
-    bool quoted = false;
     ForEach([&](DAParamKind kind, const char* bytes, std::size_t size) {
-        for (; *at != '?' || quoted; ++at) {
-            quoted = quoted != (*at == '\'');
-            text += *at;
-        }
-        ++at;
+        const char* mark = std::strchr(at, '?');
+        text.append(at, mark);
+        at = mark + 1;
         switch (kind) {
         case DAParamKind::Integer: {
             std::int64_t value = 0;

@@ -63,8 +63,9 @@ public:
     // use. Returns 0, or the first binding's failure.
     int Bind(sqlite3_stmt* stmt) const;
 
-    // Appends shape to text with each "?" outside quotes replaced by its
-    // value as the generator writes it: 'a''b', 42, NULL, X'00FF'.
+    // Appends shape to text with each "?" replaced by its value as the
+    // generator writes it: 'a''b', 42, NULL, X'00FF'. The shape holds
+    // one "?" per value, and no other.
     void Render(const char* shape, std::string& text) const;
 
 private:
@@ -104,8 +105,9 @@ struct DASqlView {
 // What the generator writes: with shaped false, the statement's text
 // (what DASqlGenerator gives); with shaped true, its shape in sql and the
 // values in params, exactly what DASplitLiterals takes out of that text.
-// A request whose text would not split (more literals than parameters,
-// an update without conditions whose values hold " AND") comes back as
+// A request whose text would not split so (more literals than
+// parameters, an update without conditions whose values hold " AND", a
+// name with a quote, a "?" or another byte a split refuses) comes back as
 // text, shaped false.
 struct DASqlStatement {
     std::string sql;

@@ -143,7 +143,9 @@ bool DASplitAppend(const char* piece, std::string& shape, DASqlParams& values)
             }
             errno = 0;
             integer = std::strtoll(c, nullptr, 10);
-            if (!whole || errno == ERANGE) {
+            // Leading zeros stay too: a value taken out is written back
+            // as the integer's own digits.
+            if (!whole || errno == ERANGE || (c[0] == '0' && end - c > 1)) {
                 shape.append(c, end);
                 c = end;
                 continue;

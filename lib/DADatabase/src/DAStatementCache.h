@@ -21,8 +21,9 @@
 // opens a literal. Taken out: a quoted text (quotes undoubled), an unquoted
 // integer that fits 64 bits, NULL where a value stands (after "(", "," or
 // "="; "IS NULL" stays), and X'..' with upper-case hex digits, as the
-// generator writes them. Other numbers (reals, integers beyond 64 bits)
-// stay in the shape, as SQLite's reading of them is not repeated here.
+// generator writes them. Other numbers (reals, integers beyond 64 bits or
+// with leading zeros) stay in the shape, as SQLite's reading of them is
+// not repeated here.
 // Returns false, with shape and values unspecified, for any other text:
 // another statement (schema statements take no parameters), an
 // unterminated literal, a ';', a comment, a quoted name, a parameter of
