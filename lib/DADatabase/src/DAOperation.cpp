@@ -55,7 +55,7 @@ const char* FailureText(const DAErrorText& error, int rc)
     return error != nullptr ? error.get() : sqlite3_errstr(rc);
 }
 
-// Prepares or runs statement on db, as text or as shape and values.
+// Prepares (or runs) statement on db, as text or as shape and values.
 int PrepareStatement(DAConnectionSource& source, sqlite3* db, const DASqlView& statement, DAStatementLease& stmt)
 {
     return statement.shaped ? source.PrepareShaped(db, statement.sql, statement.values, stmt)
@@ -116,9 +116,9 @@ int RunWrite(DAConnectionSource& source, Request& request, const char* func, con
 }
 
 // The query frame: acquire for reading, generate(db, statement), prepare
-// under busy-retry,
-// and on success return parse(parser, db, stmt, mayBeStale); on failure log
-// "<word> FAILED[rc]: text" under func and return the preparation's code.
+// under busy-retry, and on success return parse(parser, db, stmt,
+// mayBeStale); on failure log "<word> FAILED[rc]: text" under func and
+// return the preparation's code.
 // A statement the source kept from before a schema change it cannot follow
 // (parse gave kDAStaleStatement) is prepared again from the text, so that
 // the operation ends as on a fresh connection. When no connection can be
