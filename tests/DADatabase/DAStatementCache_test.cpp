@@ -52,9 +52,9 @@ const SplitCase kSplits[] = {
 TEST(DASplitLiterals, TakesOutTheLiteralsOfPlainDmlOnly)
 {
     const char* const kMarks[] = {"", "#", "null", "x"};
+    std::string shape;
+    DASqlParams values;  // reused, as a session reuses its own
     for (const SplitCase& c : kSplits) {
-        std::string shape;
-        DASqlParams values;
         const bool split = DASplitLiterals(c.sql, shape, values);
         EXPECT_EQ(*c.shape != '\0', split) << c.sql;
         if (split) {
@@ -73,8 +73,6 @@ TEST(DASplitLiterals, TakesOutTheLiteralsOfPlainDmlOnly)
     for (int i = 1; i < 999; ++i) {
         in += ", '" + std::to_string(i) + "'";
     }
-    std::string shape;
-    DASqlParams values;
     EXPECT_TRUE(DASplitLiterals((in + ")").c_str(), shape, values));
     EXPECT_FALSE(DASplitLiterals((in + ", '999')").c_str(), shape, values)) << "more literals than parameters";
 }
