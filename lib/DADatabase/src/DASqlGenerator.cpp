@@ -223,7 +223,9 @@ void WriteInsert(const char* head, DABaseSet& request, const std::string& table,
     for (const auto* value : ordered) {
         sql.append(value->column).append(", ");
     }
-    CutAtLast(sql, ", ");  // names are plain: the cut falls after the last
+    if (!data.empty() || !ordered.empty()) {
+        sql.resize(sql.size() - 2);  // the separator after the last name
+    }
     sql += ") VALUES (";
     const std::size_t bare = sql.size();
     for (const auto& entry : data) {
