@@ -290,6 +290,7 @@ const SqlCase kCases[] = {
         Q(r).AddGroupBy("a"), Q(r).AddGroupBy("b.c"); }},
     {kInsert, kContacts, {{kPhone, "010"}, {kName, "Kim's"}}, {},
      "INSERT INTO contacts (name, phone) VALUES ('Kim''s', '010')"},
+    {kInsert, "a, b", {}, {}, "INSERT INTO a, b () VALUES ()"},  // the name list alone is cut
     {kInsert, kContacts, {{kName, "Kim"}}, {}, "INSERT OR IGNORE INTO contacts (name) VALUES ('Kim')",
      [](DABaseSet& r) { static_cast<DAInsertRequest&>(r).SetIgnoreExisting(); }},
     {kSearchIndex, "m", {{"i", ""}}, {{"a", ""}, {"b", ""}},
