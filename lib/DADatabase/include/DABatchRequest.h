@@ -26,11 +26,11 @@ struct DAOperations;
 /// Add writes a request's statement at once, as the request's own
 /// operation writes it, and keeps only the statement: the request may be
 /// changed or destroyed afterwards. A write (upsert, update, delete,
-/// insert) is kept as its shape with its values beside it, which a
-/// session binds into the statement it keeps for that shape; elsewhere it
-/// runs as the very text DASqlGenerator gives. The statements are kept
-/// one after another in a single buffer, so a batch holds little more
-/// than the statements' own bytes.
+/// insert) is kept as its shape with its values beside it, bound when the
+/// batch runs into one statement prepared per shape, with the effect of
+/// the text DASqlGenerator gives. The statements are kept one after
+/// another in a single buffer, so a batch holds little more than the
+/// statements' own bytes.
 ///
 /// Location rule of Add: a request with no location at all runs at the
 /// batch's location. A request whose location is set (both parts) must
