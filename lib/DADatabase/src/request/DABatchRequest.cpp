@@ -21,8 +21,8 @@ int DABatchRequest::AddStatement(Request& request)
     if (rc != SQLITE_OK) {
         return rc;
     }
-    // Kept as shape and values where the statement takes them: a session
-    // binds them into the statement it keeps for the shape.
+    // Kept as shape and values where the statement takes them: the run
+    // binds them into one statement prepared per shape.
     DASqlStatement statement;
     statement.shaped = true;
     DAWriteSql(request, statement);
