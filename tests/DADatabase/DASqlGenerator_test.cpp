@@ -346,6 +346,7 @@ const SqlCase kCases[] = {
         Q(r).SetOrderBy("ts"), Q(r).SetLimit(5, 5), r.SetWhere("x", DACompare::Less, 3), Q(r).ClearOrderBy();
         Q(r).ClearLimit(), r.ClearWhere(), r.ClearData(), r.SetWhere("a", DACompare::Equal, 1); }},
     {kUpdate, "t", {{kName, "a AND b"}}, {}, "UPDATE t SET name = 'a"},
+    {kUpdate, "? AND t", {{kName, ""}}, {}, "UPDATE ?"},
     {kUpdate, "t", {{kName, "n"}}, {}, "UPDATE t SET name = 'm', phone = NULL WHERE ", [](DABaseSet& r) {
         r.SetNull(kPhone), r.ClearData(), r.SetData(kName, "m"), r.SetNull(kPhone); }},
 };

@@ -173,9 +173,10 @@ void AppendWhere(DASqlStatement& out, DABaseSet& request, bool always)
         if (!always) {
             return;
         }
-        // The cut can reach back into the text's literals: a shape, which
-        // has none, would not be cut where the text is.
-        if (out.shaped && AnyTextHoldsAnd(out.params)) {
+        // The cut then reaches back before " WHERE ": into the text's
+        // literals, which a shape does not have, or into a name, which
+        // would drop values the shape still holds. Either way, text only.
+        if (out.shaped && (out.sql.find(" AND") != std::string::npos || AnyTextHoldsAnd(out.params))) {
             out.shaped = false;
             return;
         }
