@@ -347,6 +347,7 @@ const SqlCase kCases[] = {
         Q(r).ClearLimit(), r.ClearWhere(), r.ClearData(), r.SetWhere("a", DACompare::Equal, 1); }},
     {kUpdate, "t", {{kName, "a AND b"}}, {}, "UPDATE t SET name = 'a"},
     {kUpdate, "? AND t", {{kName, ""}}, {}, "UPDATE ?"},
+    {kSelect, "t--", {}, {{kName, "a"}}, "SELECT * FROM t-- WHERE name='a'"},
     {kUpdate, "t", {{kName, "n"}}, {}, "UPDATE t SET name = 'm', phone = NULL WHERE ", [](DABaseSet& r) {
         r.SetNull(kPhone), r.ClearData(), r.SetData(kName, "m"), r.SetNull(kPhone); }},
 };
