@@ -132,8 +132,11 @@ TEST_P(TypedValues, EveryTypeThroughEveryWriteReadsBackExactly)
     At(query, Dir(), "v").SetOrderBy("id");
     DATypedCursor cursor;
     std::string ids;
-    DAQueryRequest reversed;  // a result the cursor held before: replaced whole
+    DAQueryRequest reversed;  // a result the cursor held before, its names too: replaced whole
     At(reversed, Dir(), "v").SetOrderBy("id", true);
+    for (const char* column : {"z", "b", "n", "e", "r", "hi", "lo", "id"}) {
+        reversed.AddColumn(column);
+    }
     ASSERT_EQ(0, ON(Query, reversed, cursor));
     ASSERT_EQ(0, ON(Query, query, cursor));
     while (cursor.MoveToNext() == 0) {

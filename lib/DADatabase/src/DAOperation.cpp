@@ -576,7 +576,7 @@ int DAOperations::TypedQuery(DAConnectionSource& source, Request& request, DATyp
                 cursor.m_store = std::make_unique<DATypedStore>();
             }
             DATypedStore& store = *cursor.m_store;
-            const auto start = [](void* user) { static_cast<DATypedStore*>(user)->Clear(false); };
+            const auto start = [](void* user) { static_cast<DATypedStore*>(user)->Clear(); };
             const int rc = DAStepRows(parser, db, stmt, failure, &store, mayBeStale, start, AppendRow);
             if (rc != kDAStaleStatement && store.rows == 0) {
                 store.TakeNames(stmt);

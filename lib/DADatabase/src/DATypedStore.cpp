@@ -55,11 +55,8 @@ bool ReadValue(sqlite3_stmt* stmt, int i, DAValueType& stored, std::uint64_t& va
 
 }  // namespace
 
-void DATypedStore::Clear(bool keepNames)
+void DATypedStore::Clear()
 {
-    if (!keepNames) {
-        names.clear();
-    }
     types.clear();
     values.clear();
     arena.clear();
@@ -94,18 +91,30 @@ void DATypedStore::Fit()
 
 void DATypedStore::TakeNames(sqlite3_stmt* stmt)
 {
-    const int count = sqlite3_column_count(stmt);
+    const auto count = static_cast<std::size_t>(sqlite3_column_count(stmt));
+    std::size_t same = 0;
+    if (names.size() == count) {
+        for (; same < count; ++same) {
+            const char* name = sqlite3_column_name(stmt, static_cast<int>(same));
+            if (std::strcmp(names[same].c_str(), name != nullptr ? name : "") != 0) {
+                break;
+            }
+        }
+    }
+    if (same == count) {
+        return;
+    }
     names.clear();
-    names.reserve(static_cast<std::size_t>(count));
-    for (int i = 0; i < count; ++i) {
-        const char* name = sqlite3_column_name(stmt, i);
+    names.reserve(count);
+    for (std::size_t i = 0; i < count; ++i) {
+        const char* name = sqlite3_column_name(stmt, static_cast<int>(i));
         names.emplace_back(name != nullptr ? name : "");
     }
 }
 
 int DATypedStore::Append(sqlite3_stmt* stmt)
 {
-    if (names.empty()) {
+    if (rows == 0) {
         TakeNames(stmt);
     }
     const auto count = static_cast<int>(names.size());

@@ -23,12 +23,12 @@ struct DATypedStore {
     DATypedStore(DATypedStore&&) = default;
     DATypedStore& operator=(DATypedStore&&) = default;
 
-    // Forgets the rows, keeping the buffers' capacity; the names too unless
-    // keepNames.
-    void Clear(bool keepNames);
+    // Forgets the rows, keeping the buffers' capacity and the names (the
+    // first row or TakeNames replaces them).
+    void Clear();
 
-    // Appends stmt's current row (its column names first, if none are
-    // known yet). Returns SQLITE_ROW, or SQLITE_NOMEM when SQLite could not
+    // Appends stmt's current row (taking its column names first, at the
+    // first row). Returns SQLITE_ROW, or SQLITE_NOMEM when SQLite could not
     // give a text or blob.
     int Append(sqlite3_stmt* stmt);
 
@@ -41,7 +41,8 @@ struct DATypedStore {
     // cursor holds its result as long as the app keeps it.
     void Fit();
 
-    // Takes stmt's column names when no row gave them.
+    // Makes names stmt's column names; names already equal to them stay,
+    // so a cursor queried again with the same statement copies none.
     void TakeNames(sqlite3_stmt* stmt);
 
     std::vector<std::string> names;
