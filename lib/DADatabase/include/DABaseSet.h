@@ -195,6 +195,8 @@ public:
     ///@}
 
 private:
+    friend struct DARequestParts;  // the statement writer reads the parts without copying them
+
     // Which setter family an integer of another type came through.
     enum class Target { Data, Where, Condition };
 

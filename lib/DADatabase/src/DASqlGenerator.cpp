@@ -7,6 +7,7 @@
 #include <utility>
 #include <vector>
 
+#include "DARequestParts.h"
 #include "DASqlLiteral.h"
 #include "DASqlStatement.h"
 #include "DAStatementCache.h"
@@ -94,11 +95,12 @@ void AppendIncrement(DASqlStatement& out, const DABaseSet::TypedValue& value)
 
 // Appends one listed condition: "ts<1700000000000", "k IN ('a', 'b')",
 // "v IS NULL".
-void AppendCondition(DASqlStatement& out, const DABaseSet::Condition& condition)
+template <typename Condition>
+void AppendCondition(DASqlStatement& out, const char* column, const Condition& condition)
 {
     static const char* const kOperators[] = {"=", "<>", "<", "<=", ">", ">=", " LIKE ", " LIKE ", " LIKE ", " LIKE "};
     std::string& sql = out.sql;
-    sql += condition.column;
+    sql += column;
     switch (condition.form) {
     case DABaseSet::Condition::Form::Compare:
         sql += kOperators[static_cast<int>(condition.op)];
@@ -166,11 +168,8 @@ bool AnyTextHoldsAnd(const DASqlParams& params)
 // ever.
 void AppendWhere(DASqlStatement& out, DABaseSet& request, bool always)
 {
-    DAValueMap conditions;
-    std::vector<DABaseSet::Condition> listed;
-    request.GetWhereMap(conditions);
-    request.GetConditions(listed);
-    if (conditions.empty() && listed.empty()) {
+    const DAValueMap& conditions = DARequestParts::Where(request);
+    if (conditions.empty() && !DARequestParts::HasConditions(request)) {
         if (!always) {
             return;
         }
@@ -189,10 +188,10 @@ void AppendWhere(DASqlStatement& out, DABaseSet& request, bool always)
         AppendLiteral(out, condition.second);
         out.sql += " AND ";
     }
-    for (const auto& condition : listed) {
-        AppendCondition(out, condition);
+    DARequestParts::ForEachCondition(request, [&](const char* column, const auto& condition) {
+        AppendCondition(out, column, condition);
         out.sql += " AND ";
-    }
+    });
     CutAtLast(out.sql, " AND");
 }
 
@@ -201,10 +200,8 @@ void AppendWhere(DASqlStatement& out, DABaseSet& request, bool always)
 // shared shape.
 void WriteInsert(const char* head, DABaseSet& request, const std::string& table, DASqlStatement& out)
 {
-    DAValueMap data;
-    std::vector<DABaseSet::TypedValue> typed;
-    request.GetDataMap(data);
-    request.GetTypedData(typed);
+    const DAValueMap& data = DARequestParts::Data(request);
+    const std::vector<DABaseSet::TypedValue>& typed = DARequestParts::Typed(request);
 
     // The increments' columns come last, their delta as the value.
     std::vector<const DABaseSet::TypedValue*> ordered;
@@ -478,10 +475,8 @@ void WriteUpsert(DAUpsertRequest& request, DASqlStatement& out)
     text += ") DO UPDATE SET ";
     // Every column but the keys takes the new row's value, in the insert's
     // column order; the increments add to the row there is.
-    DAValueMap data;
-    std::vector<DABaseSet::TypedValue> typed;
-    request.GetDataMap(data);
-    request.GetTypedData(typed);
+    const DAValueMap& data = DARequestParts::Data(request);
+    const std::vector<DABaseSet::TypedValue>& typed = DARequestParts::Typed(request);
     const auto isKey = [&](const char* column) { return std::find(keys.begin(), keys.end(), column) != keys.end(); };
     const std::size_t bare = text.size();
     for (const auto& entry : data) {
@@ -511,11 +506,9 @@ void WriteUpsert(DAUpsertRequest& request, DASqlStatement& out)
 void WriteUpdate(DAUpdateRequest& request, DASqlStatement& out)
 {
     std::string table;
-    DAValueMap data;
-    std::vector<DABaseSet::TypedValue> typed;
     request.GetTable(table);
-    request.GetDataMap(data);
-    request.GetTypedData(typed);
+    const DAValueMap& data = DARequestParts::Data(request);
+    const std::vector<DABaseSet::TypedValue>& typed = DARequestParts::Typed(request);
 
     std::string& text = out.sql;
     text.append("UPDATE ").append(table).append(" SET ");
