@@ -18,10 +18,10 @@
 struct DATypedStore {
     DATypedStore() = default;
     ~DATypedStore() = default;
+    // Neither copied nor moved: row points back at the store, which a
+    // cursor holds by pointer.
     DATypedStore(const DATypedStore&) = delete;
     DATypedStore& operator=(const DATypedStore&) = delete;
-    DATypedStore(DATypedStore&&) = default;
-    DATypedStore& operator=(DATypedStore&&) = default;
 
     // Forgets the rows, keeping the buffers' capacity and the names (the
     // first row or TakeNames replaces them).
