@@ -3,6 +3,8 @@
 
 #include <cstdint>
 #include <cstring>
+#include <memory>
+#include <utility>
 #include <vector>
 
 #include <sqlite3.h>
@@ -188,6 +190,13 @@ void bench::TypedCases(const Location& at)
         query.SetWhere("id", static_cast<std::int64_t>(++*key % kMessages + 1));
         DATypedCursor cursor;
         return session->Query(query, cursor) + (cursor.GetCount() == 1 ? 0 : 1);
+    });
+    // The same read as an app repeating it would write it: one request and one cursor, a new key each time.
+    auto reused = std::make_shared<std::pair<DAQueryRequest, DATypedCursor>>();
+    reused->first.SetTable("m");
+    Add("typed/bykey/" + at.name + "/libreuse", [session, reused, key] {
+        reused->first.SetWhere("id", static_cast<std::int64_t>(++*key % kMessages + 1));
+        return session->Query(reused->first, reused->second) + (reused->second.GetCount() == 1 ? 0 : 1);
     });
     sqlite3* raw = nullptr;
     sqlite3_open(path.c_str(), &raw);
