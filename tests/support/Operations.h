@@ -341,13 +341,14 @@ inline const Operation kOperations[] = {
          rc = rc * 10 + RUN(t, Search, search, cursor);  // fails as a query does
          DABasePath at;
          At(at, dir);
+         rc = rc * 10 + RUN_AT(t, at, DropSearchIndex, "titles_data");  // the index "titles"' own table
          for (const char* name : {"titles;", "titles"}) {  // the second removes everything, its table gone
              rc = rc * 100 + RUN_AT(t, at, DropSearchIndex, name);
          }
          return static_cast<int>(rc);
      },
      kSteps | kHeavy,
-     "11012100 / / ok|0/contacts;contacts_by_name/1|Kim|010;2|Lee|011;3|Park|012/\n"
+     "110112100 / / ok|0/contacts;contacts_by_name/1|Kim|010;2|Lee|011;3|Park|012/\n"
      "4 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex SUCCESS[0]\n"
      "4 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex SUCCESS[0]\n"
      "6 DADatabase.cpp:CreateSearchIndex > CreateSearchIndex FAILED[1]: no such column: nope\n"
@@ -355,6 +356,7 @@ inline const Operation kOperations[] = {
      "6 DASearchIndexRequest.cpp:SetName > INVALID NAME, NOT STORED\n"
      "4 DADatabase.cpp:DropTable > DropTable SUCCESS[0]\n"
      "6 DADatabase.cpp:Search > SEARCH FAILED[1]: no such table: groups\n"
+     "6 DADatabase.cpp:DropSearchIndex > DropSearchIndex FAILED[1]: table ulo_search_titles_data may not be dropped\n"
      "6 DADatabase.cpp:DropSearchIndex > DropSearchIndex FAILED[21]: invalid name\n"
      "4 DADatabase.cpp:DropSearchIndex > DropSearchIndex SUCCESS[0]"},
     {"keeping_rows_counters_row_ids_applied_steps",

@@ -224,7 +224,8 @@ public:
 
     /// Removes everything CreateSearchIndex added for the index name, in
     /// one transaction; also when its table is gone, and 0 when there is
-    /// nothing to remove. Lines "DropSearchIndex SUCCESS[0]" /
+    /// nothing to remove. Another index's own table is never removed (1,
+    /// see DASearchIndexRequest). Lines "DropSearchIndex SUCCESS[0]" /
     /// "DropSearchIndex FAILED[rc]: text". A name that is not plain (see
     /// DASearchIndexRequest), null included, returns 21 with the line
     /// "DropSearchIndex FAILED[21]: invalid name", nothing opened.

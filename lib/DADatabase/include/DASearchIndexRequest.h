@@ -30,7 +30,10 @@ enum class DASearchTokens {
 /// - the triggers ulo_search_NAME_insert, ulo_search_NAME_update and
 ///   ulo_search_NAME_delete on T.
 /// DADatabase::DropSearchIndex removes all of it. T needs a rowid (a
-/// WITHOUT ROWID table fails with SQLite's code and text).
+/// WITHOUT ROWID table fails with SQLite's code and text). A name that
+/// makes ulo_search_NAME one of another index's own tables ("x_data" while
+/// index "x" is there) fails to be created or dropped with 1 and SQLite's
+/// text; index "x" stays whole.
 ///
 /// Every name is copied at the call and must be a plain name (letters,
 /// digits, '_' and bytes from 0x80 up, not starting with a digit), since it

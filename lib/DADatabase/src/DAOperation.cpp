@@ -212,6 +212,26 @@ int VisitRow(void* user, sqlite3_stmt* stmt)
     return rc != SQLITE_ROW ? rc : each.visit(each.store.row) ? SQLITE_ROW : SQLITE_DONE;
 }
 
+// Holds SQLite's defensive mode on db for its lifetime, then restores what
+// was set. A search index's tables are FTS5 shadow tables, and an index's
+// own name can be another's shadow ("x_data" is index "x"'s): SQLite then
+// refuses to create, write or drop it, where it would damage index "x".
+class DADefensiveScope {
+public:
+    explicit DADefensiveScope(sqlite3* db) : m_db(db)
+    {
+        sqlite3_db_config(m_db, SQLITE_DBCONFIG_DEFENSIVE, -1, &m_was);
+        sqlite3_db_config(m_db, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
+    }
+    ~DADefensiveScope() { sqlite3_db_config(m_db, SQLITE_DBCONFIG_DEFENSIVE, m_was, nullptr); }
+    DADefensiveScope(const DADefensiveScope&) = delete;
+    DADefensiveScope& operator=(const DADefensiveScope&) = delete;
+
+private:
+    sqlite3* m_db;
+    int m_was = 0;
+};
+
 // The transaction core of batches and migrations, on a held connection:
 // "BEGIN IMMEDIATE", then decide() under the write lock (any code but 0
 // stops there), the count statements packed at statements
@@ -229,6 +249,7 @@ int RunTransaction(DAConnectionSource& source, sqlite3* db, const char* statemen
                    int& step, Decide decide, Finish finish, After after = After())
 {
     const DARollbackGuard rollback(db);
+    const DADefensiveScope defensive(db);
     // IMMEDIATE takes the write lock now, so a busy file shows (and is
     // waited for) before any statement runs.
     step = 0;
