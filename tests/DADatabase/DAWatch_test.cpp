@@ -230,7 +230,8 @@ TEST_F(WatchTest, RefusesBadInput)
 
 // A writer killed right after its commit: the change is still reported. No
 // descriptor to be had: Open fails with 14 and holds nothing. The file
-// replaced by another: 14, the watch closed.
+// replaced by another: 14, the watch closed. Opened on another file, a
+// table watched before is watched there too (its three triggers).
 TEST_F(WatchTest, KilledWriterNoDescriptorsAndAReplacedFile)
 {
     DAWatch watch;
@@ -260,4 +261,11 @@ TEST_F(WatchTest, KilledWriterNoDescriptorsAndAReplacedFile)
     EXPECT_EQ(14, watch.Check(changed));
     EXPECT_EQ(Strings{"contacts"}, changed);
     EXPECT_EQ(-1, watch.GetFd());
+    const std::string second = Dir() + "/second";
+    std::filesystem::create_directory(second);
+    RawDb(second + "/t.db").Run(kSeed);
+    DABasePath there;
+    ASSERT_EQ(
+        0, OpenWatch(watch) + watch.AddTable("contacts") + watch.Open(At(there, second)) + watch.AddTable("contacts"));
+    EXPECT_EQ("3", RawDb(second + "/t.db").Query("SELECT count(*) FROM sqlite_master WHERE type = 'trigger'"));
 }
